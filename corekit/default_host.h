@@ -1,0 +1,4 @@
+// The description of the host that is simulated when no other is named.
+#pragma once
+
+const char *DefaultHostText();

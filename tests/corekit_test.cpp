@@ -1,0 +1,266 @@
+// The stand-in itself: what the other tests rest on.
+#include "corekit/control.h"
+#include "support/corekit.h"
+#include "tests/fixed_clock.h"
+
+#include <chrono>
+#include <cstring>
+#include <gtest/gtest.h>
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace {
+
+using Bytes = std::vector<unsigned char>;
+struct Key {
+    Key(int64_t value) : number(value) {}
+    Key(const char *value) : text(value) {}
+    int64_t number = 0;
+    const char *text = nullptr;
+};
+using List = std::unique_ptr<KnfParamListRec, void (*)(KnfParamList)>;
+
+List Parameters(uint32_t kind, const std::vector<Key> &keys) {
+    List list(KNF_ParamListCreate(kind, static_cast<uint32_t>(keys.size())), KNF_ParamListDestroy);
+    for (const Key &key : keys) {
+        EXPECT_EQ(key.text != nullptr ? KNF_ParamListAddString(list.get(), key.text)
+                                      : KNF_ParamListAddInt(list.get(), key.number),
+                  0U);
+    }
+    return list;
+}
+
+KnfStatus Get(uint32_t node, const std::vector<Key> &keys, Bytes *record) {
+    return KNF_Get(node, Parameters(KNF_INSTANCE_LIST, keys).get(), record->data(),
+                   static_cast<uint32_t>(record->size()));
+}
+
+KnfStatus Set(uint32_t node, const std::vector<Key> &keys, const std::vector<Key> &input) {
+    return KNF_Set(node, Parameters(KNF_INSTANCE_LIST, keys).get(), Parameters(KNF_INPUT_LIST, input).get(), nullptr,
+                   0);
+}
+
+template <typename Number = uint64_t>
+Number At(const Bytes &record, size_t offset) {
+    Number value = 0;
+    memcpy(&value, record.data() + offset, sizeof value);
+    return value;
+}
+
+Bytes Record(uint32_t node, const std::vector<Key> &keys, size_t size) {
+    Bytes record(size);
+    EXPECT_EQ(Get(node, keys, &record), 0U) << node;
+    return record;
+}
+
+void Load(const std::string &text) {
+    std::string error;
+    ASSERT_TRUE(CorekitLoad("host name=h pcpus=2\n" + text, &error)) << error;
+}
+
+constexpr char SMALL[] = "switch s\nvm v leader=7 vcpus=2 used=300\n"
+                         "vnic switch=s port=5 vm=v model=parlan3 tx=1001 rx=700 size=100 errors=3\n";
+
+}  // namespace
+
+TEST(Corekit, NullAndFullListsAreRefusedAndHarmless) {
+    EXPECT_EQ(KNF_ParamListAddInt(nullptr, 1), KNF_FAILURE);
+    EXPECT_EQ(KNF_ParamListAddString(nullptr, "a"), KNF_FAILURE);
+    EXPECT_EQ(KNF_ParamListUsedCount(nullptr), 0U);
+    EXPECT_EQ(KNF_ParamListGetParam(nullptr, 0), nullptr);
+    KNF_ParamListRemoveLastParam(nullptr);
+    KNF_ParamListDestroy(nullptr);
+
+    List list(KNF_ParamListCreate(1, 2), KNF_ParamListDestroy);
+    KNF_ParamListRemoveLastParam(list.get());
+    char text[] = "name";
+    EXPECT_EQ(KNF_ParamListAddString(list.get(), text), 0U);
+    text[0] = 'X';  // the list keeps a copy
+    EXPECT_EQ(KNF_ParamListAddInt(list.get(), -9), 0U);
+    EXPECT_NE(KNF_ParamListAddInt(list.get(), 3), 0U);
+    EXPECT_EQ(KNF_ParamListUsedCount(list.get()), 2U);
+    const char *got = nullptr;
+    EXPECT_EQ(KNF_ParamListGetString(list.get(), 0, &got), 0U);
+    EXPECT_STREQ(got, "name");
+    got = nullptr;
+    EXPECT_NE(KNF_ParamListGetString(list.get(), 1, &got), 0U);
+    EXPECT_NE(KNF_ParamListGetString(list.get(), 2, &got), 0U);
+    EXPECT_EQ(got, nullptr);
+    EXPECT_EQ(KNF_ParamGetInt(KNF_ParamListGetParam(list.get(), 1)), -9);
+    EXPECT_STREQ(KNF_ParamGetString(KNF_ParamListGetParam(list.get(), 2)), "");
+    for (KnfStatus status : {0U, KNF_FAILURE, 1U, 0xffffffffU}) {
+        EXPECT_GT(strlen(HCK_ReturnStatusToString(status)), 3U);
+    }
+}
+
+TEST(Corekit, FormattingTellsTextThatDoesNotFit) {
+    char buffer[8];
+    EXPECT_EQ(Str_Snprintf(buffer, sizeof buffer, "%d-%Ld", 12, -345LL), 7);  // exactly full
+    EXPECT_STREQ(buffer, "12--345");
+    EXPECT_LE(Str_Snprintf(buffer, sizeof buffer, "%s", "12345678"), 0);
+    EXPECT_EQ(buffer[7], 0);
+    EXPECT_LE(Str_Snprintf(buffer, 0, "%s", "1"), 0);
+}
+
+TEST(Corekit, NothingIsReadBeforeAConnection) {
+    CorekitUnload();
+    Bytes record(36);
+    EXPECT_NE(Get(603, {}, &record), 0U);
+    EXPECT_NE(KNF_UseCache("/nonexistent", 0), 0U);
+    EXPECT_EQ(HckSyscall_Init(1, 0, 0), 0);
+    EXPECT_EQ(Get(603, {}, &record), 0U);
+}
+
+TEST(Corekit, CountersFollowClockRateAndCourse) {
+    Load(std::string(SMALL) + "field 269 \"s\" 5 at=16 width=8 start=18446744073709551615 rate=2\n"
+                              "field 269 \"s\" 5 at=88 width=4 start=100 rate=-7 then=2:50 then=3:0xffffffff:1\n");
+    Bytes start = Record(269, {"s", 5}, 160);
+    EXPECT_EQ(start, Record(269, {"s", 5}, 160));  // a clock that stands still moves nothing, noise included
+    EXPECT_NE(At(start, 40), 0U);
+    FixedClockAdvance(1500000);
+    Bytes later = Record(269, {"s", 5}, 160);
+    EXPECT_EQ(At(later, 0) - At(start, 0), 1126U);   // 751 a second
+    EXPECT_EQ(At(later, 24) - At(start, 24), 375U);  // 250 a second
+    EXPECT_EQ(At(later, 80) - At(start, 80), 105000U);
+    EXPECT_EQ(At(later, 16), 2U);             // -1 + 3, wrapped
+    EXPECT_EQ(At<uint32_t>(later, 88), 90U);  // 100 - 10, cut towards zero
+    FixedClockAdvance(500000);
+    EXPECT_EQ(At<uint32_t>(Record(269, {"s", 5}, 160), 88), 50U);
+    FixedClockAdvance(3000000);
+    EXPECT_EQ(At<uint32_t>(Record(269, {"s", 5}, 160), 88), 1U);
+}
+
+TEST(Corekit, PortHistogramsCountWhileStartedAndRestartAtReset) {
+    Load(SMALL);
+    auto count = [](uint32_t node, size_t size) { return At(Record(node, {"s", 5}, size), 24); };
+    FixedClockAdvance(1000000);
+    EXPECT_EQ(count(332, 224), 0U);
+    EXPECT_EQ(Set(331, {"s", 5}, {"start", "input"}), 0U);
+    FixedClockAdvance(2000000);
+    Bytes record = Record(332, {"s", 5}, 224);
+    uint64_t samples = 0;
+    for (size_t bucket = 0; bucket <= 11; bucket++) {
+        samples += At(record, 32 + 16 * bucket);
+    }
+    EXPECT_EQ(At(record, 24), samples);
+    EXPECT_NEAR(static_cast<double>(samples), 1400, 12);
+    EXPECT_EQ(At(record, 40), 64U);
+    EXPECT_EQ(count(333, 224) + count(327, 272), 0U);  // neither the other direction nor another family
+    EXPECT_EQ(Set(331, {"s", 5}, {"reset", "input"}), 0U);
+    EXPECT_EQ(count(332, 224), 0U);
+    FixedClockAdvance(1000000);
+    EXPECT_EQ(Set(331, {"s", 5}, {"stop", "input"}), 0U);
+    uint64_t stopped = count(332, 224);
+    EXPECT_NEAR(static_cast<double>(stopped), 700, 12);
+    FixedClockAdvance(1000000);
+    EXPECT_EQ(count(332, 224), stopped);
+    EXPECT_NE(Set(331, {"s", 6}, {"start", "input"}), 0U);
+    EXPECT_NE(Set(269, {"s", 5}, {1}), 0U);
+}
+
+TEST(Corekit, VcpuHistogramsFollowTheHostWideOption) {
+    Load(SMALL);
+    auto count = [] { return At(Record(776, {10007000, "RUN"}, 352), 24); };
+    uint64_t start = count();
+    EXPECT_NE(start, 0U);
+    FixedClockAdvance(1000000);
+    EXPECT_EQ(count(), start);
+    EXPECT_EQ(Set(520, {"Cpu", "TrackHistos"}, {1}), 0U);
+    EXPECT_EQ(Record(519, {"Cpu", "TrackHistos"}, 1572)[544], '1');
+    FixedClockAdvance(1000000);
+    EXPECT_NEAR(static_cast<double>(count() - start), 300, 12);
+}
+
+TEST(Corekit, FaultsFailTheCallsTheyName) {
+    struct Case {
+        const char *fault;
+        const char *outcome;  // of five reads of port 5's counters, then one of port 6's
+    };
+    for (const Case &row : {Case{"fault get 269", "FFFFFF"}, Case{"fault get 269 \"s\" 5 nth=2", ".F...."},
+                            Case{"fault get 269 \"s\" 5 from=3", "..FFF."}, Case{"fault get nth=6", ".....F"},
+                            Case{"fault get 266", "......"}, Case{"fault list", "......"}}) {
+        Load(std::string(SMALL) + "plain switch=s port=6 type=2\n" + row.fault + "\n");
+        std::string outcome;
+        for (int64_t port : {5, 5, 5, 5, 5, 6}) {
+            Bytes record(160);
+            outcome += Get(269, {"s", port}, &record) == 0 ? '.' : 'F';
+        }
+        EXPECT_EQ(outcome, row.outcome) << row.fault;
+    }
+    Load("fault create from=3\n");
+    List list(KNF_ParamListCreate(1, 9), KNF_ParamListDestroy);
+    ASSERT_TRUE(CorekitFault("fault add key=\"L3\" nth=2 status=0x77\n"));
+    CorekitRecord(true);
+    KnfStatus status = 0;
+    EXPECT_EQ(KNF_ParamListAddString(list.get(), "L3"), 0U);
+    EXPECT_EQ(KNF_ParamListAddString(list.get(), "L3"), 0x77U);
+    List second(KNF_ParamListCreate(0, 1), KNF_ParamListDestroy);
+    EXPECT_NE(second, nullptr);
+    EXPECT_EQ(KNF_ParamListCreate(0, 1), nullptr);
+    EXPECT_EQ(KNF_Get(9, list.get(), &status, 4), 0xbad0003U);
+    std::vector<std::string> lines = {"add \"L3\" -> 0x0", "add \"L3\" -> 0x77", "create 0 1 -> 0x0",
+                                      "create 0 1 -> 0xbad000f", "get 9 \"L3\" -> 0xbad0003"};
+    EXPECT_EQ(CorekitRecorded(), lines);
+    CorekitRecord(false);
+    EXPECT_EQ(CorekitCallCounts().add, 2U);
+}
+
+TEST(Corekit, ErrorsInDescriptionsNameLineAndExpectation) {
+    const std::vector<std::pair<const char *, const char *>> cases = {
+        {"switch s\nswich t\n", "text:3: keyword \"swich\": expected host, pcpu"},
+        {"\n# c\nswitch s\nvnic switch=s port=1 vm=v model=3\n", "text:5: vm \"v\" unknown: expected the name of a vm"},
+        {"switch s\nplain switch=s port=1 type=2 colour=3\n", "text:3: key colour= unknown or repeated: expected"},
+        {"vm v leader=x\n", "text:2: leader= \"x\": expected a number from 1 to"},
+        {"vm v\n", "text:2: no leader=: expected leader=<number>"},
+        {"switch \"s\n", "text:2: open text: expected a closing quote"},
+        {"switch s{i/0} count=2\n", "text:2: braces in \"s{i/0}\": expected {i}"},
+        {"field 603 at=33 width=4 start=1\n", "text:2: at= goes past the record: expected 4 bytes within 36"},
+        {"field 9 at=0 width=4 start=1\n", "text:2: no such instance: expected node and keys"},
+        {"fault add 269\n", "text:2: node too many: expected none"},
+        {"host name=again\n", "text:2: keyword \"host\": expected one host line"},
+    };
+    for (const auto &[text, expected] : cases) {
+        std::string error;
+        EXPECT_FALSE(CorekitLoad(std::string("host name=h\n") + text, &error));
+        EXPECT_EQ(error.substr(0, strlen(expected)), expected);
+    }
+    Bytes record(36);
+    EXPECT_NE(Get(603, {}, &record), 0U);  // nothing of a bad description stays connected
+}
+
+TEST(Corekit, TenThousandPortsInTwoLinesLoadAtOnce) {
+    auto start = std::chrono::steady_clock::now();
+    Load("switch load{i} count=100\nvm w{i} leader={1000+i} vcpus=2 count=10000\n"
+         "vnic switch=load{i/100} port={100000+i} vm=w{i} model=parlan3 scheme={i%3} tx={i*10} count=10000\n");
+    EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(10));
+    KnfParamList ports = nullptr;
+    ASSERT_EQ(KNF_GetInstanceListAlloc(264, Parameters(1, {"load99"}).get(), &ports), 0U);
+    EXPECT_EQ(KNF_ParamListUsedCount(ports), 100U);
+    EXPECT_EQ(KNF_ParamGetInt(KNF_ParamListGetParam(ports, 99)), 109999);
+    KNF_ParamListDestroy(ports);
+    Bytes status = Record(266, {"load99", 109999}, 3316);
+    EXPECT_STREQ(reinterpret_cast<const char *>(status.data()) + 148, "w9999");
+    EXPECT_EQ(At<uint32_t>(status, 1196), 10999U);
+}
+
+TEST(Corekit, SizesMustMatchAndTextsEndInTheirSpan) {
+    std::string longName(1200, 'n');
+    Load("switch s\nplain switch=s port=5 type=2 client=" + longName + "\nfill 368 5 at=1032 size=1024 byte=65\n" +
+         "text 266 \"s\" 5 at=148 value=\"over\"\nremove 269 \"s\" 5\nlist 753 9 = 4 \"five\"\n");
+    Bytes status = Record(266, {"s", 5}, 3316);
+    EXPECT_STREQ(reinterpret_cast<const char *>(status.data()) + 148, "over");
+    EXPECT_EQ(status[1194], 'n');
+    EXPECT_EQ(status[1195], 0);
+    EXPECT_EQ(Record(368, {5}, 2056)[2055], 'A');
+    Bytes shorter(3315), gone(160);
+    EXPECT_EQ(Get(266, {"s", 5}, &shorter), 0xbad0004U);
+    EXPECT_EQ(Get(269, {"s", 5}, &gone), 0xbad0003U);
+    EXPECT_EQ(Get(266, {"s", "5"}, &status), 0xbad0003U);  // a key's type counts
+    KnfParamList list = nullptr;
+    EXPECT_NE(KNF_GetInstanceListAlloc(753, nullptr, &list), 0U);
+    EXPECT_EQ(list, nullptr);
+    ASSERT_EQ(KNF_GetInstanceListAlloc(753, Parameters(1, {9}).get(), &list), 0U);
+    EXPECT_STREQ(KNF_ParamGetString(KNF_ParamListGetParam(list, 1)), "five");
+    KNF_ParamListDestroy(list);
+}
