@@ -1,0 +1,81 @@
+#include "driver/sampling.h"
+
+#include "driver/signals.h"
+#include "driver/source.h"
+#include "driver/watched.h"
+#include "support/run.h"
+
+#include <unistd.h>
+
+namespace {
+
+void ReadPorts(bool first) {
+    for (i32 i = 0; i < numPorts; i++) {
+        PortRead(port[i], first);
+        LeaveIfTerminated();
+    }
+}
+
+void PrintPorts(ReportBuf *report) {
+    ReportPrintf(report, ",\n\"ports\":[");
+    for (i32 i = 0; i < numPorts; i++) {
+        ReportPrintf(report, i == 0 ? "\n\n{" : ",\n\n{");
+        PortPrint(port[i], report);
+        ReportPrintf(report, "}");
+        LeaveIfTerminated();
+    }
+    ReportPrintf(report, "]");
+}
+
+// Waits for the next sample. False when there is none.
+bool NextSample(const Settings *settings) {
+    if (cacheEnabled != 0) {
+        return false;
+    }
+    WaitInterval(settings->interval);
+    LeaveIfTerminated();
+    return true;
+}
+
+void FirstPass(ReportBuf *report) {
+    ReadPorts(true);
+    ReportPrintf(report, "{ \"sysinfo\": { \"hostname\": \"%s\" }", "");
+    ReportPrintf(report, ",\n\"stats\": [\n");
+}
+
+void Iterate(i32 iteration, i64 lastTime, ReportBuf *report) {
+    ReadPorts(false);
+    i64 now = SampleTime();
+    if (iteration != 0) {
+        ReportPrintf(report, ",\n");
+    }
+    ReportPrintf(report, "{ \"time\": %Ld, \"interval\": %Ld, \"iteration\": %d", now, now - lastTime, iteration);
+    PrintPorts(report);
+    ReportPrintf(report, " }");
+    ReportFlush(report);
+    LeaveIfTerminated();
+}
+
+}  // namespace
+
+int RunSampling(Settings *settings, ReportBuf *report) {
+    i64 lastTime = SampleTime();
+    FirstPass(report);
+    for (i32 iteration = 0; !report->gaveUp && NextSample(settings); iteration++) {
+        Iterate(iteration, lastTime, report);
+        lastTime = SampleTime();
+        if (iteration + 1 >= settings->iterations) {
+            break;
+        }
+    }
+    ReportPrintf(report, "\n] }\n");
+    ReportFlush(report);
+    LeaveIfTerminated();
+    Teardown();
+    if (report->gaveUp) {
+        return 1;
+    }
+    close(report->outFd);
+    close(report->closeFd);
+    return 0;
+}

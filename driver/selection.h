@@ -1,0 +1,9 @@
+// The choice of ports: fills the port array from the options or a configuration file, once, at start-up.
+#pragma once
+
+#include "driver/options.h"
+#include "support/prefs.h"
+
+// The first selector of the priority list that was given decides; the others are ignored. Returns with at least one
+// port, or ends the process.
+void SelectPorts(const Settings &settings);

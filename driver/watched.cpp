@@ -1,0 +1,47 @@
+#include "driver/watched.h"
+
+#include "support/log.h"
+#include "support/run.h"
+
+#include <cstdlib>
+
+Port **port = nullptr;
+i32 numPorts = 0;
+i32 maxPorts = 0;
+
+namespace {
+
+constexpr i32 GROWTH = 16;  // entries
+
+void Grow() {
+    std::size_t size = static_cast<std::size_t>(numPorts + GROWTH) * sizeof(Port *);
+    void *grown = std::realloc(static_cast<void *>(port), size);
+    if (grown == nullptr) {
+        Panic("Unable to grow port size from %d to %d\n", maxPorts, maxPorts + GROWTH);
+    }
+    port = static_cast<Port **>(grown);
+    maxPorts += GROWTH;
+}
+
+}  // namespace
+
+void AppendPort(u64 portNum, const PortPrefs *prefs) {
+    if (numPorts == maxPorts) {
+        Grow();
+    }
+    port[numPorts] = PortCreate(portNum, prefs);
+    if (port[numPorts] != nullptr) {
+        numPorts++;
+    }
+    LeaveIfTerminated();
+}
+
+i32 Teardown() {
+    return 0;
+}
+
+void LeaveIfTerminated() {
+    if (terminateRequested != 0) {
+        std::exit(Teardown() + 1);
+    }
+}

@@ -1,0 +1,81 @@
+#include "tests/run_meter.h"
+
+#include <cstdlib>
+#include <fstream>
+#include <gtest/gtest.h>
+#include <sstream>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace {
+
+const std::string &Directory() {
+    static const std::string directory = [] {
+        char name[] = "/tmp/meter-test-XXXXXX";
+        return std::string(mkdtemp(name)) + "/";
+    }();
+    static const struct Cleaner {
+        std::string path = directory;
+        ~Cleaner() { (void)std::system(("rm -rf " + path).c_str()); }
+    } cleaner;
+    return directory;
+}
+
+}  // namespace
+
+nlohmann::json MeterRun::Document() const {
+    nlohmann::json document = nlohmann::json::parse(out, nullptr, false);
+    EXPECT_FALSE(document.is_discarded()) << "not JSON: " << out << err;
+    return document;
+}
+
+nlohmann::json MeterRun::Port(unsigned long long number, std::size_t iteration) const {
+    nlohmann::json document = Document();
+    for (const auto &port : document.at("stats").at(iteration).at("ports")) {
+        if (port.value("id", 0ULL) == number) {
+            return port;
+        }
+    }
+    return {};
+}
+
+MeterRun RunMeter(const std::string &host, const std::string &arguments, const RunOptions &options) {
+    return RunScript(host, "$METER >out 2>err " + arguments, options);
+}
+
+MeterRun RunScript(const std::string &host, const std::string &script, const RunOptions &options) {
+    for (const char *left : {"out", "err", "trace", "journal"}) {
+        unlink((Directory() + left).c_str());
+    }
+    std::string meter = "env COREKIT_TRACE=trace COREKIT_JOURNAL=journal " + options.environment;
+    if (!host.empty()) {
+        WriteRunFile("host.txt", host);
+        meter += " COREKIT_HOST=host.txt";
+    }
+    if (!options.realClock) {
+        meter += " ASAN_OPTIONS=verify_asan_link_order=0 LD_PRELOAD=" FIXED_CLOCK;
+    }
+    WriteRunFile("script", "METER='" + meter + " " METER_BINARY "'\n" + script + "\n");
+    int status = std::system(("cd " + Directory() + " && sh ./script").c_str());
+    int code = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    return {code, RunFile("out"), RunFile("err"), RunFile("trace"), RunFile("journal")};
+}
+
+std::string RunFile(const std::string &name) {
+    std::ifstream file(Directory() + name, std::ios::binary);
+    std::ostringstream text;
+    text << file.rdbuf();
+    return text.str();
+}
+
+void WriteRunFile(const std::string &name, const std::string &text) {
+    std::ofstream(Directory() + name, std::ios::binary) << text;
+}
+
+std::size_t Count(const std::string &text, const std::string &part) {
+    std::size_t count = 0;
+    for (std::size_t at = text.find(part); at != std::string::npos; at = text.find(part, at + part.size())) {
+        count++;
+    }
+    return count;
+}
