@@ -1,10 +1,16 @@
 #include "ports/port.h"
 
+#include "cpu/vcpu.h"
+#include "hoststack/hostnic.h"
+#include "pnic/physnic.h"
+#include "ports/histo.h"
 #include "support/alloc.h"
 #include "support/elapsed.h"
 #include "support/log.h"
 #include "support/number.h"
 #include "support/run.h"
+#include "vnic/vnic.h"
+#include "worldlet/wdt.h"
 
 #include <algorithm>
 #include <cstdlib>
@@ -112,10 +118,67 @@ PortPrefs DefaultPrefs(u32 type) {
     }
 }
 
+// At most one NIC companion, by the port's type.
+void CreateNic(Port *port) {
+    bool nic = (*port->prefs & PREF_VNIC) != 0;
+    u32 type = port->info.type.type;
+    if (nic && type == PORT_TYPE_UPLINK) {
+        port->physnic = PhysNicCreate(port->info.status.clientName, port->prefs);
+    } else if (nic && type == PORT_TYPE_HOST_NIC) {
+        port->hostNic = HostNicCreate();
+    } else if (type == PORT_TYPE_VNIC && (*port->prefs & (PREF_VNIC | PREF_COALESCE)) != 0) {
+        port->vnic = VnicCreate(port->info.type.subType, port->prefs);
+    }
+}
+
+// The port's worldlets are those that bear the name of its NIC, or the world leader of its virtual machine.
+void CreateWorldlets(Port *port) {
+    char mask[128] = "";
+    u32 type = port->info.type.type;
+    if (type == PORT_TYPE_UPLINK || type == PORT_TYPE_HOST_NIC) {
+        Str_Snprintf(mask, sizeof mask, "%s", port->info.status.clientName);
+    } else if (type == PORT_TYPE_VNIC) {
+        Str_Snprintf(mask, sizeof mask, "NetWdt-Async-%u", port->info.status.worldLeader);
+    }
+    if (mask[0] != '\0') {
+        port->wdt = WdtCreate(mask);
+    }
+}
+
+// Null companions are no failure. False, logged, when the histograms' argument list can't be made.
+bool CreateCompanions(Port *port) {
+    u32 worldLeader = port->info.status.worldLeader;
+    if (worldLeader != 0) {
+        port->numVcpus = VcpusCreate(worldLeader, (*port->prefs & PREF_VCPU_HISTO) != 0, &port->vcpus);
+    }
+    CreateNic(port);
+    if ((*port->prefs & PREF_WDT) != 0) {
+        CreateWorldlets(port);
+    }
+    if ((*port->prefs & (PREF_HISTO | PREF_HISTO_ARGS)) != 0) {
+        port->histoParams = KNF_ParamListCreate(KNF_INPUT_LIST, 2);
+        if (port->histoParams == nullptr) {
+            LogMsg(0, "Unable to create input arguments for histograms\n");
+            return false;
+        }
+    }
+    if ((*port->prefs & PREF_HISTO) != 0) {
+        HistoAlloc(port);
+    }
+    return true;
+}
+
 // Undoes a creation that failed half-way.
 void Unwind(Port *port) {
     DropList(&port->portParams);
     DropList(&port->queueParams);
+    DropList(&port->histoParams);
+    VcpusCleanup(port->vcpus, port->numVcpus);
+    HistoFree(port);
+    VnicCleanup(port->vnic);
+    HostNicCleanup(port->hostNic);
+    PhysNicCleanup(port->physnic);
+    WdtCleanup(port->wdt);
     std::free(port->curStats);
     std::free(port->prevStats);
     std::free(port->prefs);
@@ -127,6 +190,37 @@ KnfStatus Disable(Port *port, KnfStatus status, const char *stage) {
     LogStatus(0, status, "Port %Ld Stat \"%s\" read error. Stats Disabled\n", static_cast<i64>(port->info.portNum),
               stage);
     return status;
+}
+
+bool HasHistos(const Port *port) {
+    return (*port->prefs & PREF_HISTO) != 0 && port->histoParams != nullptr;
+}
+
+// The port's one NIC companion. Only a virtual NIC's failure is the port's, with a status for it; the others go alone.
+KnfStatus ReadNic(Port *port, bool first) {
+    if (port->vnic != nullptr) {
+        return VnicRead(port, first);
+    }
+    if (port->hostNic != nullptr) {
+        if (HostNicRead(port->hostNic, first) != 0) {
+            HostNicCleanup(port->hostNic);
+            port->hostNic = nullptr;
+        }
+    } else if (port->physnic != nullptr && PhysNicRead(port->physnic, port->prefs, first) != 0) {
+        PhysNicCleanup(port->physnic);
+        port->physnic = nullptr;
+    }
+    return 0;
+}
+
+void PrintNic(Port *port, ReportBuf *report) {
+    if (port->vnic != nullptr) {
+        VnicPrint(port->vnic, port->prefs, port->elapsed, report);
+    } else if (port->hostNic != nullptr) {
+        HostNicPrint(port->hostNic, port->elapsed, report);
+    } else if (port->physnic != nullptr) {
+        PhysNicPrint(port->physnic, port->prefs, port->elapsed, report);
+    }
 }
 
 f32 Divisor(const Port *port) {
@@ -213,7 +307,7 @@ Port *PortCreate(u64 portNum, const PortPrefs *prefs) {
     LogMsg(1, "Port %Lu Switch %s Client:%s Type: %d SubType: %d\n", portNum, info.type.switchName,
            info.status.clientName, static_cast<i32>(info.type.type), static_cast<i32>(info.type.subType));
     *port->prefs = prefs != nullptr ? *prefs : DefaultPrefs(info.type.type);
-    if (!CreateLists(port)) {
+    if (!CreateLists(port) || !CreateCompanions(port)) {
         Unwind(port);
         return nullptr;
     }
@@ -225,12 +319,30 @@ KnfStatus PortRead(Port *port, bool first) {
     if (port->active == 0) {
         return 0;
     }
+    if (port->numVcpus != 0 && port->vcpus != nullptr && VcpusRead(port->vcpus, port->numVcpus, first) != 0) {
+        VcpusCleanup(port->vcpus, port->numVcpus);
+        port->vcpus = nullptr;
+        port->numVcpus = 0;
+    }
     if (KnfStatus status = NodeGet(KNF_NODE_PORT_STATUS, port->portParams, &port->info.status)) {
         return Disable(port, status, "portStatus");
     }
     PortClientStats *stats = first ? port->prevStats : port->curStats;
     if (KnfStatus status = NodeGet(KNF_NODE_PORT_CLIENT_STATS, port->portParams, stats)) {
         return Disable(port, status, "clientStats");
+    }
+    if (KnfStatus status = ReadNic(port, first)) {
+        return Disable(port, status, "vnic stats");
+    }
+    if ((*port->prefs & PREF_WDT) != 0 && port->wdt != nullptr && WdtRead(port->wdt, first) != 0) {
+        WdtCleanup(port->wdt);
+        port->wdt = nullptr;
+    }
+    if (HasHistos(port)) {
+        const char *stage = nullptr;
+        if (KnfStatus status = HistoRead(port, first, &stage)) {
+            return Disable(port, status, stage);
+        }
     }
     gettimeofday(first ? &port->prevTime : &port->curTime, nullptr);
     return 0;
@@ -252,5 +364,18 @@ KnfStatus PortPrint(Port *port, ReportBuf *report) {
     port->elapsed = elapsed;
     port->prevTime = port->curTime;
     std::swap(port->curStats, port->prevStats);
+    if (port->vcpus == nullptr && *port->prefs == nullPrefs) {
+        return 0;
+    }
+    PrintNic(port, report);
+    if ((*port->prefs & PREF_WDT) != 0 && port->wdt != nullptr) {
+        WdtPrint(port->wdt, port->prefs, elapsed, report);
+    }
+    if (port->vcpus != nullptr && port->numVcpus != 0) {
+        VcpusPrint(port->vcpus, port->numVcpus, elapsed, report);
+    }
+    if (HasHistos(port)) {
+        HistoPrint(port, report);
+    }
     return 0;
 }

@@ -12,7 +12,7 @@
 
 struct HostNicStats;
 struct PhysNic;
-struct PortHistogramHead;
+struct PortHistogram;
 struct Vcpu;
 struct Vnic;
 struct Wdt;
@@ -89,13 +89,13 @@ struct Port {
     PortClientStats *prevStats;
     timeval prevTime;  // when prevStats was filled
     timeval curTime;
-    u8 histoStarted;               // the kernel was asked to start the port's histograms
-    PortHistogramHead *pktSizeIn;  // the six histogram records, null unless the prefs ask for them
-    PortHistogramHead *pktSizeOut;
-    PortHistogramHead *clusterIn;
-    PortHistogramHead *clusterOut;
-    PortHistogramHead *pktIntervalIn;
-    PortHistogramHead *pktIntervalOut;
+    u8 histoStarted;           // the kernel was asked to start the port's histograms
+    PortHistogram *pktSizeIn;  // the six histogram records, null unless the prefs ask for them
+    PortHistogram *pktSizeOut;
+    PortHistogram *clusterIn;
+    PortHistogram *clusterOut;
+    PortHistogram *pktIntervalIn;
+    PortHistogram *pktIntervalOut;
     Wdt *wdt;  // the companions, null if absent; at most one of the NIC companions is set
     Vnic *vnic;
     PhysNic *physnic;
