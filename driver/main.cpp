@@ -1,21 +1,38 @@
 // The entry point: start-up in its fixed order, then the sampling loop.
+#include "cpu/pcpu.h"
+#include "cpu/self.h"
 #include "driver/options.h"
 #include "driver/sampling.h"
 #include "driver/selection.h"
 #include "driver/signals.h"
 #include "driver/source.h"
 #include "driver/watched.h"
+#include "ports/enumerate.h"
 #include "support/log.h"
+
+#include <fcntl.h>
+#include <unistd.h>
 
 namespace {
 
 constexpr i32 FOR_EVER = 0x3fffffff;  // iterations
+
+// A standard descriptor that was closed at start would be given to the next file that the process or its library
+// opens, and the report would go there. A descriptor that can only be read makes each write to it fail instead.
+void ReserveStandardDescriptors() {
+    int fd = 0;
+    do {
+        fd = open64("/dev/null", O_RDONLY);
+    } while (fd >= 0 && fd <= STDERR_FILENO);
+    close(fd);
+}
 
 void Connect(Settings *settings) {
     if (settings->iterations < 1) {
         settings->iterations = FOR_EVER;
     }
     if (settings->cacheSpec != nullptr) {
+        CacheStep(&settings->cacheSpec, settings->checkVersion);
         settings->iterations = FOR_EVER;
         return;
     }
@@ -29,6 +46,7 @@ int main(int argc, char **argv) {
     char buffer[4096];
     ReportBuf report = {1, 0, buffer, sizeof buffer, 0, 0, false};
     nullPrefs = 0;
+    ReserveStandardDescriptors();
     Settings settings = ParseOptions(argc, argv);
     if (settings.interval < 0) {
         Panic("Invalid interval %d\n", settings.interval);
@@ -41,8 +59,17 @@ int main(int argc, char **argv) {
         return 1;
     }
     if (settings.listPorts) {
-        return ReportFlush(&report) != 0 && report.gaveUp ? 1 : 0;
+        ListPorts(&report);
+        ReportFlush(&report);
+        LeaveIfTerminated();
+        return report.gaveUp ? 1 : 0;
     }
+    if (SchedStatsCpuGlobalInfoInit() != 0) {
+        LogMsg(0, "SchedStatsCpuGlobalInfoInit failed\n");
+        KNF_ParamListDestroy(instanceParams);
+        return 1;
+    }
+    SelfVcpuInit();
     SelectPorts(settings);
     return RunSampling(&settings, &report);
 }

@@ -1,5 +1,7 @@
 #include "driver/sampling.h"
 
+#include "cpu/pcpu.h"
+#include "cpu/self.h"
 #include "driver/signals.h"
 #include "driver/source.h"
 #include "driver/watched.h"
@@ -28,9 +30,13 @@ void PrintPorts(ReportBuf *report) {
 }
 
 // Waits for the next sample. False when there is none.
-bool NextSample(const Settings *settings) {
+bool NextSample(Settings *settings) {
     if (cacheEnabled != 0) {
-        return false;
+        if (settings->cacheSpec == nullptr) {
+            return false;
+        }
+        KNF_CacheCleanup();
+        return CacheStep(&settings->cacheSpec, settings->checkVersion) == 0;
     }
     WaitInterval(settings->interval);
     LeaveIfTerminated();
@@ -38,19 +44,25 @@ bool NextSample(const Settings *settings) {
 }
 
 void FirstPass(ReportBuf *report) {
+    SchedStatsPcpuStats(true);
     ReadPorts(true);
-    ReportPrintf(report, "{ \"sysinfo\": { \"hostname\": \"%s\" }", "");
+    SelfVcpuRead(true);
+    ReportPrintf(report, "{ \"sysinfo\": { \"hostname\": \"%s\" }", hostName != nullptr ? hostName : "");
     ReportPrintf(report, ",\n\"stats\": [\n");
 }
 
 void Iterate(i32 iteration, i64 lastTime, ReportBuf *report) {
+    SchedStatsPcpuStats(false);
     ReadPorts(false);
     i64 now = SampleTime();
     if (iteration != 0) {
         ReportPrintf(report, ",\n");
     }
     ReportPrintf(report, "{ \"time\": %Ld, \"interval\": %Ld, \"iteration\": %d", now, now - lastTime, iteration);
+    SchedStatsCpuPrint(report);
     PrintPorts(report);
+    SelfVcpuRead(false);
+    OverheadPrint(report);
     ReportPrintf(report, " }");
     ReportFlush(report);
     LeaveIfTerminated();

@@ -10,3 +10,7 @@ bool CheckVersion();
 
 // The report's clock, in whole seconds.
 i64 SampleTime();
+
+// Moves a replay to the next snapshot of the list, which it cuts up in place; null when none is left. Returns 0, or
+// why the snapshot can't be used. Snapshots that go back in time end the process.
+KnfStatus CacheStep(char **cacheSpec, bool checkVersion);

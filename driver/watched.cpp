@@ -1,5 +1,7 @@
 #include "driver/watched.h"
 
+#include "cpu/vcpu_histo.h"
+#include "ports/histo.h"
 #include "support/log.h"
 #include "support/run.h"
 
@@ -42,6 +44,7 @@ i32 Teardown() {
 
 void LeaveIfTerminated() {
     if (terminateRequested != 0) {
-        std::exit(Teardown() + 1);
+        Teardown();
+        std::exit(1);
     }
 }

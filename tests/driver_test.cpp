@@ -1,0 +1,175 @@
+#include "tests/run_meter.h"
+
+#include <chrono>
+#include <gtest/gtest.h>
+
+namespace {
+
+// A host on which every figure of the frame is known.
+const std::string HOST = R"(
+host name=h1 pcpus=2 packages=1 cores=1 llc=7
+self used=5
+switch sw0
+plain switch=sw0 port=7 type=2 client=probe
+field 797 0 at=0 width=8 start=50 rate=250
+field 797 0 at=16 width=8 start=7 rate=125
+field 797 0 at=48 width=8 start=9 rate=1000
+field 797 1 at=0 width=8 start=1 rate=1000
+field 797 1 at=16 width=8 start=4 rate=0
+field 797 1 at=48 width=8 start=2 rate=3000
+field 266 "sw0" 7 at=1208 width=4 start=0x0f0e0d0c
+field 266 "sw0" 7 at=1212 width=2 start=0x1100
+field 266 "sw0" 7 at=3310 width=4 start=3
+field 269 "sw0" 7 at=0 width=8 start=1000 rate=1000
+field 269 "sw0" 7 at=8 width=8 start=5000 rate=600000
+field 269 "sw0" 7 at=16 width=8 start=70 rate=3
+field 269 "sw0" 7 at=24 width=8 start=5 rate=500
+field 269 "sw0" 7 at=32 width=8 start=9 rate=150000
+field 269 "sw0" 7 at=72 width=8 start=90000 rate=20
+field 269 "sw0" 7 at=80 width=8 start=80000 rate=30020
+field 269 "sw0" 7 at=88 width=8 start=5 rate=0
+)";
+
+std::string Record(const std::string &time, const std::string &iteration) {
+    return "{ \"time\": " + time + ", \"interval\": 2, \"iteration\": " + iteration +
+           R"(,
+"cpu": { "topology": { "core": 2, "llc": 7, "package": 2},
+"used": [ 25.00,  33.33,   58.33],
+"wdt": [ 12.50,   0.00,   12.50] },
+"ports":[
+
+{"name": "probe", "switch": "sw0", "id": 7, "mac": "0c:0d:0e:0f:00:11", "rxmode": 3, "uplink": "false",
+  "txpps": 1500, "txmbps": 6.0, "txsize": 500, "txeps": 3.00, "rxpps": 20, "rxmbps": 0.2, "rxsize": 1501, "rxeps": 0.00}],
+
+"overhead": {"used": 0.50 } })";
+}
+
+TEST(Driver, WholeDocumentByteForByte) {
+    MeterRun run = RunMeter(HOST, "-p 7 -i 2 -n 2");
+    EXPECT_EQ(run.out, "{ \"sysinfo\": { \"hostname\": \"h1\" },\n\"stats\": [\n" + Record("1700000002", "0") + ",\n" +
+                           Record("1700000004", "1") + "\n] }\n");
+    EXPECT_EQ(run.err, "");
+    EXPECT_EQ(run.status, 0);
+    EXPECT_EQ(run.journal, "") << "a run that asks for no histograms writes nothing to the kernel";
+}
+
+TEST(Driver, DefaultsAreTenSecondsAndOneRecord) {
+    nlohmann::json stats = RunMeter(HOST, "-p 7").Document()["stats"];
+    ASSERT_EQ(stats.size(), 1U);
+    EXPECT_EQ(stats[0]["interval"], 10);
+}
+
+// Arguments, exit status, and what must stand on standard output and standard error, whole.
+TEST(Driver, EveryWayOutOfStartUpHasItsTextAndStatus) {
+    std::string usage = RunMeter(HOST, "-h").out;
+    EXPECT_EQ(usage.substr(0, 45), "Usage:\n\t -l                 : List ports in s");
+    EXPECT_TRUE(usage.ends_with("\tbe some inconsistency in numbers, hopefully, not a lot\n"));
+    struct Row {
+        const char *arguments;
+        int status;
+        std::string out;
+        std::string err;
+    };
+    const Row rows[] = {
+        {"-p 7 --help -i", 0, usage, ""},
+        {"-p 7 left over", 1, usage, ""},
+        {"-p 7 -i -3", 1, "", "Panic: Invalid interval -3\n"},
+        {"-p 7 -i 4294967293", 1, "", "Panic: Invalid interval -3\n"},
+        {"-i 0", 1, "", "Panic: Please provide atleast one valid port/switch for monitoring\n"},
+        {"-p 0x7", 1, "", "Panic: Please provide atleast one valid port/switch for monitoring\n"},
+        {"-x -p 99", 1, "",
+         "Log0: xmlformat is now deprecated\nLog0 Status: No such node instance. Message: GetPortsInfo 99 Port "
+         "Type\nPanic: Invalid -p option"},
+        {"-d 2 -o /nowhere/file -p 7", 1, "",
+         "Unable to open file /nowhere/file for writing. Error:No such file or "
+         "directory\n"},
+    };
+    for (const Row &row : rows) {
+        MeterRun run = RunMeter(HOST, row.arguments);
+        EXPECT_EQ(run.status, row.status) << row.arguments;
+        EXPECT_EQ(run.out, row.out) << row.arguments;
+        EXPECT_EQ(run.err, row.err) << row.arguments;
+    }
+}
+
+TEST(Driver, BadOptionsAreDroppedAtTheLevelInForceWhenTheyCome) {
+    EXPECT_EQ(Count(RunMeter(HOST, "-Z -d 2 -p 7 -i 1").err, "Discarding"), 0U);
+    MeterRun run = RunMeter(HOST, "-d 2 -Z --nonsense -p 7 -i 1");
+    EXPECT_EQ(run.status, 0);
+    EXPECT_EQ(Count(run.err, "Log2: Discarding bad Option (?:3f)\n"), 2U);
+}
+
+TEST(Driver, SignatureMismatchEndsTheRunUnlessToldOtherwise) {
+    std::string host = HOST;
+    host.insert(host.find(" llc=7") + 6, " signature=\"another build of the kernel\"");
+    MeterRun refused = RunMeter(host, "-p 7 -i 1");
+    EXPECT_EQ(refused.status, 1);
+    EXPECT_NE(refused.err.find(": md5 signature mismatch with running hostcore built on another build of the. (vs "),
+              std::string::npos);
+    EXPECT_EQ(refused.out, "");
+    MeterRun forced = RunMeter(host, "-f -p 7 -i 1");
+    EXPECT_EQ(forced.status, 0);
+    EXPECT_EQ(forced.err, refused.err);
+}
+
+TEST(Driver, ReportGoesToTheFileGiven) {
+    MeterRun run = RunMeter(HOST, "-p 7 -i 1 -o file");
+    EXPECT_EQ(run.out, "");
+    EXPECT_EQ(RunFile("file"), RunMeter(HOST, "-p 7 -i 1").out);
+}
+
+TEST(Driver, FullDiskIsToldAndEndsTheRunOnceTextIsLost) {
+    MeterRun once = RunMeter(HOST, "-p 7 -i 1 -o /dev/full");
+    EXPECT_EQ(once.status, 0);
+    EXPECT_EQ(Count(once.err, "Error No space left on device\n"), 2U) << "end of the iteration, end of the document";
+    MeterRun longer = RunMeter(HOST, "-p 7 -i 1 -n 0 -o /dev/full");
+    EXPECT_EQ(longer.status, 1);
+    EXPECT_EQ(Count(longer.err, "\n"), Count(longer.err, "Error No space left on device\n"));
+    EXPECT_EQ(RunMeter(HOST, "-p 7 -i 1 -n 50 >&-").status, 1) << "standard output closed at start";
+}
+
+TEST(Driver, ReaderThatGoesAwayEndsAnEndlessRun) {
+    MeterRun run = RunScript(HOST, "{ $METER -p 7 -i 0 -n 0 2>err; echo $? >status; } | head -c 1000 >out", {"", true});
+    EXPECT_EQ(RunFile("status"), "1\n");
+    EXPECT_EQ(run.out.size(), 1000U);
+    EXPECT_NE(run.err.find("Error Broken pipe\n"), std::string::npos);
+}
+
+// Starts a run, sends it a signal after a while, and measures how long it takes to end.
+MeterRun Signalled(const std::string &command, const std::string &signal) {
+    return RunScript(HOST,
+                     command + " & pid=$!; sleep 0.3; start=$(date +%s%N); kill -" + signal +
+                         " $pid; wait $pid; echo $? >status; echo $((($(date +%s%N) - start) / 1000000)) >ms",
+                     {"", true});
+}
+
+TEST(Driver, SignalDuringTheSleepEndsItAtOnceWithAnEmptyOutput) {
+    for (const char *signal : {"INT", "TERM", "HUP"}) {
+        MeterRun run = Signalled("$METER -p 7 -i 100 >out 2>err", signal);
+        EXPECT_EQ(RunFile("status"), "1\n") << signal;
+        EXPECT_EQ(run.out + run.err, "") << signal;
+        EXPECT_LT(std::stoi(RunFile("ms")), 200) << signal;
+    }
+    MeterRun ignored = Signalled("trap '' HUP; $METER -p 7 -i 1 >out 2>err", "HUP");
+    EXPECT_EQ(RunFile("status"), "0\n") << "a hang-up that was ignored at start stays ignored";
+    EXPECT_FALSE(ignored.Document().is_discarded());
+}
+
+TEST(Driver, SignalEndsAWriteToAReaderThatStalled) {
+    Signalled("mkfifo fifo; sleep 1 <fifo & $METER -p 7 -i 0 -n 0 >fifo 2>err", "TERM");
+    EXPECT_EQ(RunFile("status"), "1\n");
+    EXPECT_LT(std::stoi(RunFile("ms")), 500);
+}
+
+TEST(Driver, SignalLaterCutsTheDocumentBetweenTexts) {
+    MeterRun run = Signalled("$METER -p 7 -i 0 -n 0 >out 2>err", "INT");
+    EXPECT_EQ(RunFile("status"), "1\n");
+    EXPECT_EQ(Count(run.out, "\n] }\n"), 0U);
+    std::string last = run.out.substr(run.out.rfind("\"iteration\""));
+    EXPECT_TRUE(last.ends_with(" }") || last.ends_with("}") || last.ends_with("[") || last.ends_with(", ") ||
+                last.ends_with("]") || last.ends_with("\n") || std::isdigit(static_cast<unsigned char>(last.back())) ||
+                last.ends_with("\""))
+        << last;
+}
+
+}  // namespace
