@@ -16,7 +16,7 @@ namespace {
 constexpr i32 GROWTH = 16;  // entries
 
 void Grow() {
-    std::size_t size = static_cast<std::size_t>(numPorts + GROWTH) * sizeof(Port *);
+    std::size_t size = static_cast<std::size_t>(numPorts + GROWTH) * sizeof(void *);
     void *grown = std::realloc(static_cast<void *>(port), size);
     if (grown == nullptr) {
         Panic("Unable to grow port size from %d to %d\n", maxPorts, maxPorts + GROWTH);

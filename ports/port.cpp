@@ -286,7 +286,7 @@ KnfStatus GetPortsInfo(u64 portNum, PortInfo *info) {
 
 void MacToText(const u8 *mac, char *text) {
     char octets[6 * 3 + 1];  // the last octet's colon and terminator need one byte more than the text has
-    for (int i = 0; i < 6; i++) {
+    for (std::size_t i = 0; i < 6; i++) {
         Str_Snprintf(octets + 3 * i, 4, "%02x:", mac[i]);
     }
     octets[17] = '\0';
