@@ -380,6 +380,7 @@ void ApplyFault(Line *line) {
     rule.nth = static_cast<u64>(TakeNumber(line, "nth", 0, 1, MAX_I64));
     rule.from = static_cast<u64>(TakeNumber(line, "from", 1, 1, MAX_I64));
     rule.status = static_cast<KnfStatus>(TakeNumber(line, "status", STATUS_SIMULATED, 1, MAX_ID));
+    rule.signal = static_cast<int>(TakeNumber(line, "signal", 0, 1, 64));
     if (Complete(line)) {
         line->faults->push_back(std::move(rule));
     }

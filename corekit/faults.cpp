@@ -1,6 +1,7 @@
 #include "corekit/faults.h"
 
 #include <algorithm>
+#include <csignal>
 
 namespace {
 
@@ -29,7 +30,9 @@ KnfStatus FaultsCheck(std::vector<FaultRule> *rules, const FaultCall &call) {
         }
         rule.seen++;
         bool fails = rule.nth != 0 ? rule.seen == rule.nth : rule.seen >= rule.from;
-        if (fails && status == 0) {
+        if (fails && rule.signal != 0) {
+            std::raise(rule.signal);
+        } else if (fails && status == 0) {
             status = rule.status;
         }
     }

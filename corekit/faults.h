@@ -1,4 +1,4 @@
-// Failures on demand: rules that make calls of the library fail, each with its own count of the calls that it matched.
+// Failures on demand: rules that make calls of the library fail, or meet a signal, each with its own count of the calls that it matched.
 // The library asks once a call; without rules that costs nothing.
 #pragma once
 
@@ -17,6 +17,7 @@ struct FaultRule {
     uint64_t nth = 0;   // 0, or the only matching call that fails
     uint64_t from = 1;  // the first matching call that fails
     KnfStatus status = 0;
+    int signal = 0;  // raised instead of a failure, when not 0
     uint64_t seen = 0;
 };
 

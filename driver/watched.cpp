@@ -39,6 +39,10 @@ void AppendPort(u64 portNum, const PortPrefs *prefs) {
 }
 
 i32 Teardown() {
+    for (i32 i = 0; i < numPorts; i++) {
+        PortSetPrefs(port[i], &nullPrefs);
+    }
+    VcpuHistoTrack(0);
     return 0;
 }
 
