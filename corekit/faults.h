@@ -1,5 +1,5 @@
-// Failures on demand: rules that make calls of the library fail, or meet a signal, each with its own count of the calls that it matched.
-// The library asks once a call; without rules that costs nothing.
+// Failures on demand: rules that make calls of the library fail, or meet a signal, each with its own count of the calls
+// that it matched. The library asks once a call; without rules that costs nothing.
 #pragma once
 
 #include "corekit/param_list.h"

@@ -7,7 +7,6 @@
 #include "support/number.h"
 #include "support/run.h"
 
-#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <utility>
@@ -176,7 +175,7 @@ KnfStatus SchedStatsPcpuStats(bool first) {
     for (u32 i = 0; i < NUM_PCPUS; i++) {
         VaryingKey pcpu(instanceParams, i64{i});
         if (pcpu.status != 0) {
-            std::fputs("SchedStatsPcpuStats: KNF_ParamListAddInt()\n", stderr);
+            LogDirect("SchedStatsPcpuStats: KNF_ParamListAddInt()\n");
             return pcpu.status;
         }
         if (KnfStatus status = NodeGet(KNF_NODE_PCPU_STATS, instanceParams, &stats[i])) {

@@ -24,20 +24,20 @@ void ReserveStandardDescriptors() {
     do {
         fd = open64("/dev/null", O_RDONLY);
     } while (fd >= 0 && fd <= STDERR_FILENO);
-    close(fd);
+    if (fd >= 0) {
+        close(fd);
+    }
 }
 
-void Connect(Settings *settings) {
-    if (settings->iterations < 1) {
-        settings->iterations = FOR_EVER;
-    }
-    if (settings->cacheSpec != nullptr) {
-        CacheStep(&settings->cacheSpec, settings->checkVersion);
-        settings->iterations = FOR_EVER;
+// Where samples come from, and how many: a replay goes on as long as there are snapshots.
+void OpenSource(Settings *settings) {
+    if (settings->cacheSpec == nullptr) {
+        HckSyscall_Init(1, 0, 0);
+        InstallSignalHandlers();
         return;
     }
-    HckSyscall_Init(1, 0, 0);
-    InstallSignalHandlers();
+    CacheStep(&settings->cacheSpec, settings->checkVersion);
+    settings->iterations = FOR_EVER;
 }
 
 }  // namespace
@@ -51,11 +51,14 @@ int main(int argc, char **argv) {
     if (settings.interval < 0) {
         Panic("Invalid interval %d\n", settings.interval);
     }
-    Connect(&settings);
+    if (settings.iterations < 1) {
+        settings.iterations = FOR_EVER;
+    }
+    OpenSource(&settings);
     if (!CheckVersion() && settings.checkVersion) {
         return 1;
     }
-    if (settings.outfile != nullptr && OpenReportFile(settings.outfile, &report) < 0) {
+    if (settings.outfile != nullptr && Interruptibly([&] { return OpenReportFile(settings.outfile, &report); }) < 0) {
         return 1;
     }
     if (settings.listPorts) {

@@ -81,8 +81,9 @@ int RunSampling(Settings *settings, ReportBuf *report) {
         }
     }
     ReportPrintf(report, "\n] }\n");
-    ReportFlush(report);
-    LeaveIfTerminated();
+    if (ReportFlush(report) != 0) {
+        LeaveIfTerminated();
+    }
     Teardown();
     if (report->gaveUp) {
         return 1;

@@ -4,6 +4,6 @@
 #include "driver/options.h"
 #include "support/report.h"
 
-// Runs all iterations and closes the document. Returns 0, or 1 when a termination signal or an output that takes no
-// text any more ended the run; the document is then left open. Both ends go through Teardown.
+// Runs all iterations and closes the document. Returns 0, or 1 when the output took no text any more and the run was
+// given up, its document left open. A termination signal ends the process. All ends go through Teardown.
 int RunSampling(Settings *settings, ReportBuf *report);

@@ -102,7 +102,7 @@ void AddEntry(std::FILE *file, const char *word, PortPrefs cmdPrefs) {
     i64 number = std::strtoll(word, nullptr, 10);
     PortPrefs entryPrefs = cmdPrefs;
     char spec[128 + 1];
-    if (std::fscanf(file, "%128[^\n]", spec) == 1) {
+    if (Interruptibly([&] { return std::fscanf(file, "%128[^\n]", spec); }) == 1) {
         ParseStatsSpec(spec, &entryPrefs);
     }
     if (number != 0) {
@@ -113,22 +113,25 @@ void AddEntry(std::FILE *file, const char *word, PortPrefs cmdPrefs) {
 }
 
 void SkipLine(std::FILE *file) {
-    int letter = 0;
-    do {
-        letter = std::getc(file);
-    } while (letter != '\n' && letter != EOF);
+    Interruptibly([file] {
+        int letter = 0;
+        do {
+            letter = std::getc(file);
+        } while (letter != '\n' && letter != EOF);
+        return letter;
+    });
 }
 
 // A read error ends the file as its end does.
 void AddConfiguredPorts(const char *cfgFile, PortPrefs cmdPrefs) {
-    std::FILE *file = fopen64(cfgFile, "r");
+    std::FILE *file = Interruptibly([cfgFile] { return fopen64(cfgFile, "r"); });
     if (file == nullptr) {
         Panic("Unable to open config file. Error:%s\n", std::strerror(errno));
     }
     numPorts = 0;
     for (i32 line = 1; std::feof(file) == 0 && std::ferror(file) == 0; line++) {
         char word[128 + 1];
-        if (std::fscanf(file, "%128s", word) != 1) {
+        if (Interruptibly([&] { return std::fscanf(file, "%128s", word); }) != 1) {
             LogMsg(2, "Bad switch in %d line in %s file\n", line, cfgFile);
         } else if (word[0] != '#') {
             AddEntry(file, word, cmdPrefs);

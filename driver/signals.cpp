@@ -3,6 +3,7 @@
 #include "support/log.h"
 #include "support/run.h"
 
+#include <initializer_list>
 #include <poll.h>
 #include <signal.h>
 
@@ -12,12 +13,26 @@ void OnTerminate(int /*signal*/) {
     terminateRequested = 1;
 }
 
-// Without SA_RESTART: a write that waits for its reader ends with the signal.
-bool Register(int signal) {
+sigset_t handled;  // the signals that got the handler
+
+bool Register(int signal, int flags) {
     struct sigaction action = {};
     action.sa_handler = OnTerminate;
+    action.sa_flags = flags;
     sigemptyset(&action.sa_mask);
     return sigaction(signal, &action, nullptr) == 0;
+}
+
+bool RegisterFirst(int signal) {
+    return Register(signal, SA_RESTART) && sigaddset(&handled, signal) == 0;
+}
+
+void RegisterAgain(int flags) {
+    for (int signal : {SIGINT, SIGTERM, SIGHUP}) {
+        if (sigismember(&handled, signal) == 1) {
+            Register(signal, flags);
+        }
+    }
 }
 
 bool IgnoredAtStart(int signal) {
@@ -28,7 +43,9 @@ bool IgnoredAtStart(int signal) {
 }  // namespace
 
 void InstallSignalHandlers() {
-    bool registered = Register(SIGINT) && Register(SIGTERM) && (IgnoredAtStart(SIGHUP) || Register(SIGHUP));
+    sigemptyset(&handled);
+    bool registered =
+        RegisterFirst(SIGINT) && RegisterFirst(SIGTERM) && (IgnoredAtStart(SIGHUP) || RegisterFirst(SIGHUP));
     if (!registered) {
         LogMsg(0, "Error Registering SIGINT Signal Handler\n");
         LogMsg(0, "If you histograms, you should either:\n\t1. Let the program end.\t2. Manually disable them."
@@ -44,16 +61,19 @@ void WaitInterval(i32 seconds) {
         return;
     }
     // A signal between the look at the flag and the sleep stays pending until ppoll opens the mask, and ends it.
-    sigset_t termination;
     sigset_t before;
-    sigemptyset(&termination);
-    sigaddset(&termination, SIGINT);
-    sigaddset(&termination, SIGTERM);
-    sigaddset(&termination, SIGHUP);
-    sigprocmask(SIG_BLOCK, &termination, &before);
+    sigprocmask(SIG_BLOCK, &handled, &before);
     if (terminateRequested == 0) {
         timespec time = {seconds, 0};
         ppoll(nullptr, 0, &time, &before);
     }
     sigprocmask(SIG_SETMASK, &before, nullptr);
+}
+
+InterruptibleCalls::InterruptibleCalls() {
+    RegisterAgain(0);
+}
+
+InterruptibleCalls::~InterruptibleCalls() {
+    RegisterAgain(SA_RESTART);
 }

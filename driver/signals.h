@@ -1,5 +1,6 @@
-// Termination signals of live mode, and the wait that they cut short. The handler only sets `terminateRequested`, so
-// that no operation of the node interface is ever interrupted half-way.
+// Termination signals of live mode, and what they cut short. The handler only sets `terminateRequested`. System calls
+// are restarted behind it, so that no operation of the node interface fails half-way; what may wait for long, the
+// program waits for by itself.
 #pragma once
 
 #include "support/types.h"
@@ -10,3 +11,11 @@ void InstallSignalHandlers();
 
 // Sleeps so many seconds, 0 not at all. A termination signal ends it at once, also one that came just ahead of it.
 void WaitInterval(i32 seconds);
+
+// For the life of one, a termination signal ends a blocking open or read, of a file that the user named, with EINTR.
+struct InterruptibleCalls {
+    InterruptibleCalls();
+    InterruptibleCalls(const InterruptibleCalls &) = delete;
+    InterruptibleCalls &operator=(const InterruptibleCalls &) = delete;
+    ~InterruptibleCalls();
+};

@@ -4,7 +4,6 @@
 #include "support/node.h"
 #include "support/run.h"
 
-#include <cstdio>
 #include <cstring>
 #include <sys/time.h>
 
@@ -58,8 +57,8 @@ bool CheckVersion() {
         return true;
     }
     kernelSig[20] = '\0';
-    std::fprintf(stderr, "%#x: md5 signature mismatch with running hostcore built on %s. (vs %s for app sysinfo)\n",
-                 status, kernelSig, programSig);
+    LogDirect("%#x: md5 signature mismatch with running hostcore built on %s. (vs %s for app sysinfo)\n", status,
+              kernelSig, programSig);
     return false;
 }
 

@@ -2,6 +2,7 @@
 // is switched off here.
 #pragma once
 
+#include "driver/signals.h"
 #include "ports/port.h"
 
 extern Port **port;  // numPorts live entries of maxPorts
@@ -17,3 +18,15 @@ i32 Teardown();
 
 // After a termination signal: Teardown, then exit(1), without flush and closing text.
 void LeaveIfTerminated();
+
+// An open or a read that may wait for long, on a terminal or a pipe that the user named: a termination signal ends it,
+// and the run.
+template <typename Call>
+auto Interruptibly(Call call) {
+    auto result = [&call] {
+        InterruptibleCalls interruptible;
+        return call();
+    }();
+    LeaveIfTerminated();
+    return result;
+}

@@ -116,11 +116,11 @@ void HistoFree(Port *port) {
     }
 }
 
+// A record's size goes by its kind, so these reads name it themselves.
 KnfStatus HistoRead(Port *port, bool first, const char **stage) {
-    for (const HistoKind &kind : KINDS) {
-        KnfStatus status =
-            first ? 0 : KNF_Get(kind.node, port->portParams, port->*kind.record, RecordSize(kind.limits));
-        if (status != 0) {
+    for (std::size_t i = 0; !first && i < std::size(KINDS); i++) {
+        const HistoKind &kind = KINDS[i];
+        if (KnfStatus status = KNF_Get(kind.node, port->portParams, port->*kind.record, RecordSize(kind.limits))) {
             *stage = kind.stage;
             return status;
         }

@@ -1,13 +1,13 @@
 #include "support/report.h"
 
+#include "support/log.h"
+#include "support/output.h"
 #include "support/run.h"
 
 #include <cerrno>
 #include <cstdarg>
-#include <cstdio>
 #include <cstring>
 #include <fcntl.h>
-#include <poll.h>
 #include <unistd.h>
 
 namespace {
@@ -26,20 +26,6 @@ bool Fits(ReportBuf *report, const char *format, va_list arguments) {
     return false;
 }
 
-// A signal that comes between a look at the flag and a write that blocks would not end that write. So the wait for a
-// stalled reader happens here, in slices: once poll tells of room, a write of less than a pipe's atomic size does not
-// block. In replay signals have their default action and the write may just as well wait by itself.
-bool WaitForReader(int fd) {
-    pollfd entry = {fd, POLLOUT, 0};
-    while (terminateRequested == 0) {
-        int ready = cacheEnabled != 0 ? 1 : poll(&entry, 1, 50);
-        if (ready > 0 || (ready < 0 && errno != EINTR)) {
-            return true;
-        }
-    }
-    return false;
-}
-
 }  // namespace
 
 void ReportPrintf(ReportBuf *report, const char *format, ...) {
@@ -50,9 +36,8 @@ void ReportPrintf(ReportBuf *report, const char *format, ...) {
     va_start(arguments, format);
     while (!Fits(report, format, arguments)) {
         if (report->fill == 0) {
-            std::fprintf(stderr, "No Space in buffer. Resize output buffer from %d bytes\n",
-                         static_cast<int>(report->capacity));
-            std::vfprintf(stderr, format, arguments);
+            LogDirect("No Space in buffer. Resize output buffer from %d bytes\n", static_cast<int>(report->capacity));
+            LogDirectV(format, arguments);
             break;
         }
         if (ReportFlush(report) != 0) {
@@ -67,7 +52,7 @@ KnfStatus ReportFlush(ReportBuf *report) {
     if (report == nullptr || report->buffer == nullptr || report->fill < 1) {
         return 0;
     }
-    if (report->gaveUp || !WaitForReader(report->outFd)) {
+    if (report->gaveUp || !OutputReady(report->outFd) || terminateRequested != 0) {
         return KNF_FAILURE;
     }
     auto size = static_cast<std::size_t>(report->fill - report->sent);
@@ -82,7 +67,7 @@ KnfStatus ReportFlush(ReportBuf *report) {
         report->sent += static_cast<i32>(written);
     }
     if (terminateRequested == 0) {
-        std::fprintf(stderr, "Unable to write to fd %d. Error %s\n", report->outFd, std::strerror(errno));
+        LogDirect("Unable to write to fd %d. Error %s\n", report->outFd, std::strerror(errno));
     }
     return KNF_FAILURE;
 }
@@ -90,7 +75,9 @@ KnfStatus ReportFlush(ReportBuf *report) {
 i32 OpenReportFile(const char *path, ReportBuf *report) {
     int fd = open64(path, O_WRONLY | O_CREAT | O_TRUNC, 0644);
     if (fd < 0) {
-        std::fprintf(stderr, "Unable to open file %s for writing. Error:%s\n", path, std::strerror(errno));
+        if (terminateRequested == 0) {
+            LogDirect("Unable to open file %s for writing. Error:%s\n", path, std::strerror(errno));
+        }
         return fd;
     }
     report->outFd = fd;

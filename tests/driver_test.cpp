@@ -137,7 +137,8 @@ TEST(Driver, ReaderThatGoesAwayEndsAnEndlessRun) {
 
 // Starts a run, sends it a signal after a while, and measures how long it takes to end.
 MeterRun Signalled(const std::string &command, const std::string &signal) {
-    return RunScript(HOST,
+    // Enough ports that their messages fill a pipe.
+    return RunScript(HOST + "plain switch=sw0 port={100+i} type=2 client=many count=2000\n",
                      command + " & pid=$!; sleep 0.3; start=$(date +%s%N); kill -" + signal +
                          " $pid; wait $pid; echo $? >status; echo $((($(date +%s%N) - start) / 1000000)) >ms",
                      {"", true});
@@ -155,10 +156,17 @@ TEST(Driver, SignalDuringTheSleepEndsItAtOnceWithAnEmptyOutput) {
     EXPECT_FALSE(ignored.Document().is_discarded());
 }
 
-TEST(Driver, SignalEndsAWriteToAReaderThatStalled) {
-    Signalled("mkfifo fifo; sleep 1 <fifo & $METER -p 7 -i 0 -n 0 >fifo 2>err", "TERM");
-    EXPECT_EQ(RunFile("status"), "1\n");
-    EXPECT_LT(std::stoi(RunFile("ms")), 500);
+// Each run waits for somebody at the other end of a pipe, who does nothing.
+TEST(Driver, SignalEndsEveryWaitForAnotherProgram) {
+    for (const char *command :
+         {"sleep 1 <fifo & $METER -p 7 -i 0 -n 0 >fifo 2>err", "sleep 1 <fifo & $METER -d 1 -A -i 0 -n 0 2>fifo >out",
+          "$METER -p 7 -o fifo >out 2>err", "$METER -C fifo >out 2>err",
+          "{ printf '7 q'; sleep 1; } >fifo & $METER -C fifo >out 2>err"}) {
+        MeterRun run = Signalled(std::string("rm -f fifo; mkfifo fifo; ") + command, "TERM");
+        EXPECT_EQ(RunFile("status"), "1\n") << command;
+        EXPECT_LT(std::stoi(RunFile("ms")), 500) << command;
+        EXPECT_EQ(run.err, "") << command;
+    }
 }
 
 TEST(Driver, SignalLaterCutsTheDocumentBetweenTexts) {
