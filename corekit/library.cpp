@@ -5,6 +5,7 @@
 #include "corekit/faults.h"
 #include "corekit/host.h"
 #include "corekit/journal.h"
+#include "corekit/snapshot.h"
 #include "corekit/source.h"
 #include "corekit/status.h"
 
@@ -16,6 +17,7 @@
 #include <fstream>
 #include <iterator>
 #include <memory>
+#include <new>
 #include <utility>
 
 namespace {
@@ -23,6 +25,8 @@ namespace {
 struct Library {
     std::unique_ptr<Host> host;
     NodeSource live = {};
+    std::unique_ptr<Snapshot> snapshot;  // the one in use
+    NodeSource cache = {};
     const NodeSource *current = nullptr;  // what reads are served from; null while nothing is connected
     bool loadedByControl = false;
     std::vector<FaultRule> faults;
@@ -58,6 +62,16 @@ KnfStatus Told(KnfStatus status, const char *name, const uint32_t *node, const P
         JournalLine(input != nullptr, CallText(name, node, keys, input, status));
     }
     return status;
+}
+
+// No exception leaves the library: memory that is exhausted is a failed call.
+template <typename Result, typename Body>
+Result Contained(Result failed, Body body) {
+    try {
+        return body();
+    } catch (const std::bad_alloc &) {
+        return failed;
+    }
 }
 
 KnfStatus AddParam(KnfParamList list, const KnfParamRec &param) {
@@ -112,10 +126,12 @@ bool LoadNamed() {
 extern "C" {
 
 int HckSyscall_Init(int, int, int) {
-    Library &library = Lib();
-    bool connected = library.loadedByControl || LoadNamed();
-    Told(connected ? STATUS_OK : STATUS_NOT_CONNECTED, "init", nullptr, {});
-    return connected ? 0 : -1;
+    return Contained(-1, [&] {
+        Library &library = Lib();
+        bool connected = library.loadedByControl || LoadNamed();
+        Told(connected ? STATUS_OK : STATUS_NOT_CONNECTED, "init", nullptr, {});
+        return connected ? 0 : -1;
+    });
 }
 
 const char *HCK_ReturnStatusToString(KnfStatus status) {
@@ -138,65 +154,73 @@ KnfStatus KNF_CheckSig(char *kernelSig, uint32_t size, const char **programSig) 
 }
 
 KnfStatus KNF_Get(uint32_t node, KnfParamList instance, void *record, uint32_t size) {
-    KnfStatus status = CheckInstance({CALL_GET, node, instance});
-    const Params &keys = ParamListParams(instance);
-    if (status == STATUS_OK) {
-        const NodeSource *source = Lib().current;
-        status = record == nullptr ? STATUS_BAD_PARAM : source->get(source->context, node, keys, record, size);
-    }
-    return Told(status, "get", &node, keys);
+    return Contained(KNF_FAILURE, [&] {
+        KnfStatus status = CheckInstance({CALL_GET, node, instance});
+        const Params &keys = ParamListParams(instance);
+        if (status == STATUS_OK) {
+            const NodeSource *source = Lib().current;
+            status = record == nullptr ? STATUS_BAD_PARAM : source->get(source->context, node, keys, record, size);
+        }
+        return Told(status, "get", &node, keys);
+    });
 }
 
 KnfStatus KNF_Set(uint32_t node, KnfParamList instance, KnfParamList input, void *result, uint32_t size) {
-    KnfStatus status = CheckInstance({CALL_SET, node, instance});
-    const Params &keys = ParamListParams(instance);
-    const Params &arguments = ParamListParams(input);
-    if (status == STATUS_OK && input != nullptr && input->kind != KNF_INPUT_LIST) {
-        status = STATUS_BAD_PARAM;
-    }
-    if (status == STATUS_OK) {
-        const NodeSource *source = Lib().current;
-        status = source->set == nullptr ? STATUS_NOT_WRITABLE
-                                        : source->set(source->context, node, keys, arguments, result, size);
-    }
-    return Told(status, "set", &node, keys, &arguments);
+    return Contained(KNF_FAILURE, [&] {
+        KnfStatus status = CheckInstance({CALL_SET, node, instance});
+        const Params &keys = ParamListParams(instance);
+        const Params &arguments = ParamListParams(input);
+        if (status == STATUS_OK && input != nullptr && input->kind != KNF_INPUT_LIST) {
+            status = STATUS_BAD_PARAM;
+        }
+        if (status == STATUS_OK) {
+            const NodeSource *source = Lib().current;
+            status = source->set == nullptr ? STATUS_NOT_WRITABLE
+                                            : source->set(source->context, node, keys, arguments, result, size);
+        }
+        return Told(status, "set", &node, keys, &arguments);
+    });
 }
 
 KnfStatus KNF_GetInstanceListAlloc(uint32_t node, KnfParamList instance, KnfParamList *list) {
-    KnfStatus status = CheckInstance({CALL_LIST, node, instance});
-    const Params &keys = ParamListParams(instance);
-    Params entries;
-    if (status == STATUS_OK) {
-        const NodeSource *source = Lib().current;
-        status = list == nullptr ? STATUS_BAD_PARAM : source->list(source->context, node, keys, &entries);
-    }
-    if (status == STATUS_OK) {
-        *list = ParamListFrom(entries);
-    }
-    return Told(status, "list", &node, keys);
+    return Contained(KNF_FAILURE, [&] {
+        KnfStatus status = CheckInstance({CALL_LIST, node, instance});
+        const Params &keys = ParamListParams(instance);
+        Params entries;
+        if (status == STATUS_OK) {
+            const NodeSource *source = Lib().current;
+            status = list == nullptr ? STATUS_BAD_PARAM : source->list(source->context, node, keys, &entries);
+        }
+        if (status == STATUS_OK) {
+            *list = ParamListFrom(entries);
+        }
+        return Told(status, "list", &node, keys);
+    });
 }
 
 KnfParamList KNF_ParamListCreate(uint32_t kind, uint32_t capacity) {
-    KnfStatus status = CheckCall({CALL_CREATE});
-    KnfParamList list = status == STATUS_OK ? ParamListCreate(kind, capacity) : nullptr;
-    if (status == STATUS_OK && list == nullptr) {
-        status = STATUS_BAD_PARAM;
-    }
-    if (JournalWanted(false)) {
-        Told(status, "create", nullptr, {ParamOf(kind), ParamOf(capacity)});
-    }
-    return list;
+    return Contained(KnfParamList{nullptr}, [&] {
+        KnfStatus status = CheckCall({CALL_CREATE});
+        KnfParamList list = status == STATUS_OK ? ParamListCreate(kind, capacity) : nullptr;
+        if (status == STATUS_OK && list == nullptr) {
+            status = STATUS_BAD_PARAM;
+        }
+        if (JournalWanted(false)) {
+            Told(status, "create", nullptr, {ParamOf(kind), ParamOf(capacity)});
+        }
+        return list;
+    });
 }
 
 KnfStatus KNF_ParamListAddInt(KnfParamList list, int64_t value) {
-    return AddParam(list, ParamOf(value));
+    return Contained(KNF_FAILURE, [&] { return AddParam(list, ParamOf(value)); });
 }
 
 KnfStatus KNF_ParamListAddString(KnfParamList list, const char *text) {
-    if (text == nullptr) {
-        return Told(STATUS_BAD_PARAM, "add", nullptr, {});
-    }
-    return AddParam(list, ParamOf(std::string(text)));
+    return Contained(KNF_FAILURE, [&] {
+        return text == nullptr ? Told(STATUS_BAD_PARAM, "add", nullptr, {})
+                               : AddParam(list, ParamOf(std::string(text)));
+    });
 }
 
 void KNF_ParamListRemoveLastParam(KnfParamList list) {
@@ -237,12 +261,29 @@ void KNF_ParamListDestroy(KnfParamList list) {
     delete list;
 }
 
-// The place of snapshots: a file that opens becomes the current source here, and KNF_CacheCleanup takes it away again.
+// A file that can't be used leaves nothing to read, neither the snapshot before it nor the kernel.
 KnfStatus KNF_UseCache(const char *path, uint32_t) {
-    return Told(STATUS_NOT_SNAPSHOT, "cache", nullptr, {ParamOf(std::string(path != nullptr ? path : ""))});
+    return Contained(KNF_FAILURE, [&] {
+        Library &library = Lib();
+        std::string name = path != nullptr ? path : "";
+        library.current = nullptr;
+        library.snapshot = std::make_unique<Snapshot>();
+        KnfStatus status = SnapshotOpen(name.c_str(), library.snapshot.get());
+        if (status == STATUS_OK) {
+            library.cache = SnapshotSource(library.snapshot.get());
+            library.current = &library.cache;
+        } else {
+            library.snapshot = nullptr;
+        }
+        return Told(status, "cache", nullptr, {ParamOf(name)});
+    });
 }
 
+// Reads go to the kernel again, if the process is connected to it.
 KnfStatus KNF_CacheCleanup(void) {
+    Library &library = Lib();
+    library.snapshot = nullptr;
+    library.current = library.host != nullptr ? &library.live : nullptr;
     return Told(STATUS_OK, "cache-cleanup", nullptr, {});
 }
 

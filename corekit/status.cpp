@@ -22,6 +22,14 @@ const char *StatusText(KnfStatus status) {
         return "Interface signature mismatch";
     case STATUS_NOT_SNAPSHOT:
         return "Not a snapshot file";
+    case STATUS_SNAPSHOT_UNREADABLE:
+        return "Snapshot file can't be read";
+    case STATUS_SNAPSHOT_VERSION:
+        return "Snapshot of another format version or byte order";
+    case STATUS_SNAPSHOT_TRUNCATED:
+        return "Snapshot file is truncated";
+    case STATUS_SNAPSHOT_CORRUPT:
+        return "Snapshot file is corrupted";
     case STATUS_SIMULATED:
         return "Simulated failure";
     default:

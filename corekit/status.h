@@ -12,6 +12,10 @@ constexpr KnfStatus STATUS_LIST_FULL = 0xbad0006;
 constexpr KnfStatus STATUS_NOT_WRITABLE = 0xbad0007;
 constexpr KnfStatus STATUS_BAD_SIGNATURE = 0xbad0008;
 constexpr KnfStatus STATUS_NOT_SNAPSHOT = 0xbad0009;
+constexpr KnfStatus STATUS_SNAPSHOT_UNREADABLE = 0xbad000a;
+constexpr KnfStatus STATUS_SNAPSHOT_VERSION = 0xbad000b;
+constexpr KnfStatus STATUS_SNAPSHOT_TRUNCATED = 0xbad000c;
+constexpr KnfStatus STATUS_SNAPSHOT_CORRUPT = 0xbad000d;
 constexpr KnfStatus STATUS_SIMULATED = 0xbad000f;  // of a fault that names no status of its own
 
 const char *StatusText(KnfStatus status);

@@ -45,7 +45,9 @@ struct Plan {
 Plan plan;
 
 // Whether this call is the one that fails, under its own name or another.
-bool Fails(const char *name, long count) { return count == plan.nth && std::strcmp(plan.name, name) == 0; }
+bool Fails(const char *name, long count) {
+    return count == plan.nth && std::strcmp(plan.name, name) == 0;
+}
 
 }  // namespace
 

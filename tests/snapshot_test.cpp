@@ -1,0 +1,201 @@
+// The format of snapshots and their reader.
+#include "corekit/control.h"
+#include "corekit/snapshot.h"
+#include "corekit/status.h"
+
+#include <fstream>
+#include <gtest/gtest.h>
+#include <memory>
+#include <unistd.h>
+
+namespace {
+
+KnfStatus Use(const std::string &file) {
+    std::string path = testing::TempDir() + "snapshot-" + std::to_string(getpid());
+    std::ofstream(path, std::ios::binary) << file;
+    KnfStatus status = KNF_UseCache(path.c_str(), 0);
+    unlink(path.c_str());
+    return status;
+}
+
+KnfStatus Parse(const std::string &file) {
+    return SnapshotParse(file, std::make_unique<Snapshot>().get());
+}
+
+KnfStatus Get(uint32_t node, const Params &keys, std::string *record) {
+    KnfParamListRec list = {KNF_INSTANCE_LIST, 2, keys};
+    return KNF_Get(node, &list, record->data(), static_cast<uint32_t>(record->size()));
+}
+
+const Params PORT = {ParamOf("s"), ParamOf(int64_t{5})};
+
+SnapshotDraft SmallDraft() {
+    SnapshotDraft draft = {100, 900000000, "Mar 14 2024 09:26:53", {}};
+    SnapshotAppendParam(&draft.entries[SnapshotName(ENTRY_LIST, 245, {})], ParamOf("s"));
+    draft.entries[SnapshotName(ENTRY_RECORD, 269, PORT)] = std::string(90, 'x') + "0123456789";
+    draft.entries[SnapshotName(ENTRY_RECORD, 270, PORT)] = std::string(64, 'y');
+    return draft;
+}
+
+// The file with this change, and with length and checksum made right.
+std::string Repaired(std::string file, size_t at, const std::string &bytes) {
+    file.replace(at, bytes.size(), bytes);
+    file.resize(file.size() - SNAPSHOT_CHECKSUM);
+    std::string length;
+    AppendNumber(&length, file.size() + SNAPSHOT_CHECKSUM, 8);
+    file.replace(16, 8, length);
+    AppendNumber(&file, Crc64(file), SNAPSHOT_CHECKSUM);
+    return file;
+}
+
+// A page that is not packed.
+std::string Page(const std::string &first, const std::string &bytes) {
+    std::string page;
+    for (size_t number : {bytes.size(), bytes.size(), first.size()}) {
+        AppendNumber(&page, number, 4);
+    }
+    return page + first + bytes;
+}
+
+std::string PageFile(const std::string &pages) {
+    return Repaired(SnapshotEncode({}).insert(SNAPSHOT_HEADER, pages), 0, "K");
+}
+
+std::string Entry(std::string name, const std::string &body) {
+    AppendNumber(&name, body.size(), 4);
+    return name + body;
+}
+
+}  // namespace
+
+TEST(Snapshot, EveryChangeOfAByteAndEveryCutIsNoticed) {
+    const std::string file = SnapshotEncode(SmallDraft());
+    ASSERT_EQ(Parse(file), STATUS_OK);
+    for (size_t at = 0; at < file.size(); at++) {
+        EXPECT_EQ(Parse(file.substr(0, at)), STATUS_SNAPSHOT_TRUNCATED) << at;
+        std::string changed = file;
+        for (int step = 1; step < 256; step++) {
+            changed[at]++;
+            ASSERT_NE(Parse(changed), STATUS_OK) << at << " + " << step;
+        }
+    }
+    EXPECT_EQ(Parse(file + '\0'), STATUS_SNAPSHOT_CORRUPT);
+}
+
+TEST(Snapshot, BadFilesAreToldApartAndNothingIsServed) {
+    const std::string good = SnapshotEncode(SmallDraft());
+    std::string flipped = good;
+    flipped[SNAPSHOT_HEADER + 30] ^= 4;
+    const std::pair<std::string, const char *> rows[] = {
+        {"", "Snapshot file is truncated"},
+        {good.substr(0, good.size() - 1), "Snapshot file is truncated"},
+        {flipped, "Snapshot file is corrupted"},
+        {"{ \"sysinfo\": { \"hostname\": \"h\" } }", "Not a snapshot file"},
+        {Repaired(good, 8, {0, 0, 0, 2}), "Snapshot of another format version or byte order"},
+        {Repaired(good, 12, {1, 2, 3, 4}), "Snapshot of another format version or byte order"},
+        {"/nowhere/file", "Snapshot file can't be read"},
+        {"/tmp", "Snapshot file can't be read"},
+    };
+    CorekitUnload();
+    for (const auto &[file, text] : rows) {
+        std::string record(100, '\0');
+        EXPECT_EQ(Use(good), STATUS_OK);
+        EXPECT_EQ(Get(269, PORT, &record), STATUS_OK);
+        KnfStatus status = file[0] == '/' ? KNF_UseCache(file.c_str(), 0) : Use(file);
+        EXPECT_STREQ(HCK_ReturnStatusToString(status), text);
+        const char *ours = nullptr;
+        char signature[21] = {};
+        for (int cleaned = 0; cleaned < 2; cleaned++, KNF_CacheCleanup()) {
+            EXPECT_NE(Get(269, PORT, &record), STATUS_OK) << text;
+            EXPECT_NE(KNF_CheckSig(signature, sizeof signature, &ours), STATUS_OK) << text;
+            EXPECT_STREQ(signature, "");
+        }
+    }
+}
+
+TEST(Snapshot, DamageBehindAGoodChecksumIsRefused) {
+    const std::string a = SnapshotName(ENTRY_RECORD, 1, {ParamOf("a")});
+    const std::string b = SnapshotName(ENTRY_RECORD, 1, {ParamOf("b")});
+    const std::string list = SnapshotName(ENTRY_LIST, 1, {ParamOf("a")});
+    const std::string two = Entry(a, "1") + Entry(b, "2");
+    const std::string other = SnapshotName(static_cast<EntryKind>('x'), 1, {});
+    const std::string huge = "\xff\xff\xff\xff";
+    const std::string good = PageFile(Page(a, two));
+    ASSERT_EQ(Parse(good), STATUS_OK);
+    const std::pair<const char *, std::string> rows[] = {
+        {"a page without entries", PageFile(Page(a, ""))},
+        {"names that descend", PageFile(Page(b, Entry(b, "2") + Entry(a, "1")))},
+        {"a name twice", PageFile(Page(a, Entry(a, "1") + Entry(a, "2")))},
+        {"pages that descend", PageFile(Page(b, Entry(b, "2")) + Page(a, Entry(a, "1")))},
+        {"a page of another first name", PageFile(Page(b, two))},
+        {"an entry that goes past its page", PageFile(Page(a, two.substr(0, two.size() - 1)))},
+        {"a list that ends in a number", PageFile(Page(list, Entry(list, "i1234567")))},
+        {"a list that goes on as something else", PageFile(Page(list, Entry(list, "i12345678?")))},
+        {"a name of neither kind", PageFile(Page(other, Entry(other, "1")))},
+        {"a page as large as the number goes", Repaired(good, SNAPSHOT_HEADER, huge)},
+        {"a first name that does", Repaired(good, SNAPSHOT_HEADER + 8, huge)},
+    };
+    for (const auto &[what, file] : rows) {
+        EXPECT_EQ(Parse(file), STATUS_SNAPSHOT_CORRUPT) << what;
+    }
+    for (size_t size = 300; size <= 900; size += 300) {
+        std::string room(size, '\0');
+        EXPECT_EQ(Unpack(Pack(std::string(600, 'x')), &room), size == 600);
+    }
+    for (char distance : {'\0', '\1', '\4', '\5'}) {
+        std::string room(8, '\0');
+        EXPECT_EQ(Unpack(std::string("@abcd\0", 6) + distance, &room), distance == 1 || distance == 4);
+    }
+}
+
+TEST(Snapshot, EveryInstanceIsFoundAmongManyPages) {
+    SnapshotDraft draft;
+    for (int64_t port = -1; port < 20000; port += 2) {
+        std::string record(700, static_cast<char>(port / 7));
+        AppendNumber(&record, static_cast<u64>(port), 8);
+        draft.entries[SnapshotName(ENTRY_RECORD, 269, {ParamOf(port)})] = record;
+    }
+    std::string ports;  // larger than a page
+    for (int64_t port = 0; port < 100000; port++) {
+        SnapshotAppendParam(&ports, ParamOf(port));
+    }
+    draft.entries[SnapshotName(ENTRY_LIST, 269, {ParamOf(int64_t{10001})})] = ports;
+    ASSERT_EQ(Use(SnapshotEncode(draft)), STATUS_OK);
+    for (int64_t i = 0; i < 10000; i += 3) {
+        int64_t port = i * 7919 % 10000 * 2 - 1;
+        std::string record(708, '\0');
+        ASSERT_EQ(Get(269, {ParamOf(port)}, &record), STATUS_OK) << port;
+        ASSERT_EQ(record, draft.entries[SnapshotName(ENTRY_RECORD, 269, {ParamOf(port)})]);
+    }
+    KnfParamListRec key = {KNF_INSTANCE_LIST, 1, {ParamOf(int64_t{10001})}};
+    KnfParamList list = nullptr;
+    ASSERT_EQ(KNF_GetInstanceListAlloc(269, &key, &list), STATUS_OK);
+    KNF_CacheCleanup();
+    EXPECT_EQ(KNF_ParamListUsedCount(list), 100000U) << "lists outlive their snapshot";
+    EXPECT_EQ(KNF_ParamGetInt(KNF_ParamListGetParam(list, 99999)), 99999);
+    KNF_ParamListDestroy(list);
+    ASSERT_EQ(Use(SnapshotEncode(SmallDraft())), STATUS_OK);
+    std::string record(100, '\0');
+    for (const Params &keys : {Params{PORT[0]}, Params{PORT[0], ParamOf("5")}, Params()}) {
+        EXPECT_EQ(Get(269, keys, &record), STATUS_NOT_FOUND);
+    }
+    EXPECT_EQ(Get(268, PORT, &record), STATUS_NOT_FOUND);
+    EXPECT_EQ(Get(270, PORT, &record), STATUS_BAD_SIZE);
+    EXPECT_EQ(KNF_Set(269, nullptr, nullptr, nullptr, 0), STATUS_NOT_WRITABLE);
+}
+
+TEST(Snapshot, LiteralsAndCopiesOfEveryLengthSurvivePacking) {
+    std::string noise;
+    for (u64 i = 0; i < 600; i++) {
+        AppendNumber(&noise, i * 0x9e3779b97f4a7c15 >> 13, 3);
+    }
+    for (size_t length = 0; length < 600; length++) {
+        for (const std::string &bytes :
+             {std::string(length, 'x'), noise.substr(0, length), noise + noise.substr(7, length) + "end"}) {
+            std::string unpacked(bytes.size(), '\0');
+            EXPECT_TRUE(Unpack(Pack(bytes), &unpacked));
+            EXPECT_EQ(unpacked, bytes);
+        }
+    }
+    EXPECT_EQ(Crc64("123456789"), 0x995dc9bbdf1939fa);  // the published check value
+}
