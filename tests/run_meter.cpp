@@ -79,3 +79,13 @@ std::size_t Count(const std::string &text, const std::string &part) {
     }
     return count;
 }
+
+std::string Steps(const std::string &record, const std::string &counters) {
+    std::istringstream words(counters);
+    std::ostringstream out;
+    for (unsigned long long at, size, from, by; words >> at >> size >> from >> by;) {
+        out << "field " << record << " at=" << at << " width=" << size << " start=" << from << " then=4:" << from + by
+            << "\n";
+    }
+    return out.str();
+}

@@ -37,3 +37,6 @@ std::string RunFile(const std::string &name);
 void WriteRunFile(const std::string &name, const std::string &text);
 
 std::size_t Count(const std::string &text, const std::string &part);
+
+// Lines for counters of a record, each as offset, width, start and what it moves by between seconds 0 and 4.
+std::string Steps(const std::string &record, const std::string &counters);
