@@ -169,15 +169,4 @@ TEST(Driver, SignalEndsEveryWaitForAnotherProgram) {
     }
 }
 
-TEST(Driver, SignalLaterCutsTheDocumentBetweenTexts) {
-    MeterRun run = Signalled("$METER -p 7 -i 0 -n 0 >out 2>err", "INT");
-    EXPECT_EQ(RunFile("status"), "1\n");
-    EXPECT_EQ(Count(run.out, "\n] }\n"), 0U);
-    std::string last = run.out.substr(run.out.rfind("\"iteration\""));
-    EXPECT_TRUE(last.ends_with(" }") || last.ends_with("}") || last.ends_with("[") || last.ends_with(", ") ||
-                last.ends_with("]") || last.ends_with("\n") || std::isdigit(static_cast<unsigned char>(last.back())) ||
-                last.ends_with("\""))
-        << last;
-}
-
 }  // namespace
