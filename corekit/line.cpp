@@ -55,7 +55,8 @@ std::optional<i64> Evaluate(const std::string &text, i64 i) {
         return left;
     }
     std::optional<i64> right = operand(text.substr(at + 1));
-    if (!right || std::abs(*left) > MAX_ID || std::abs(*right) > MAX_ID / 2) {
+    auto within = [](i64 number, i64 limit) { return number >= -limit && number <= limit; };
+    if (!right || !within(*left, MAX_ID) || !within(*right, MAX_ID / 2)) {
         return std::nullopt;
     }
     switch (text[at]) {

@@ -4,8 +4,6 @@
 
 namespace {
 
-const std::string SIMULATED = "Log0 Status: Simulated failure. Message: ";
-
 // One VM with two vcpus behind port 7, and a port without any.
 const std::string HOST = R"(
 host name=h1 pcpus=3 packages=2 cores=2 llc=7

@@ -20,15 +20,7 @@ field 797 1 at=48 width=8 start=2 rate=3000
 field 266 "sw0" 7 at=1208 width=4 start=0x0f0e0d0c
 field 266 "sw0" 7 at=1212 width=2 start=0x1100
 field 266 "sw0" 7 at=3310 width=4 start=3
-field 269 "sw0" 7 at=0 width=8 start=1000 rate=1000
-field 269 "sw0" 7 at=8 width=8 start=5000 rate=600000
-field 269 "sw0" 7 at=16 width=8 start=70 rate=3
-field 269 "sw0" 7 at=24 width=8 start=5 rate=500
-field 269 "sw0" 7 at=32 width=8 start=9 rate=150000
-field 269 "sw0" 7 at=72 width=8 start=90000 rate=20
-field 269 "sw0" 7 at=80 width=8 start=80000 rate=30020
-field 269 "sw0" 7 at=88 width=8 start=5 rate=0
-)";
+)" + TRAFFIC;
 
 std::string Record(const std::string &time, const std::string &iteration) {
     return "{ \"time\": " + time + ", \"interval\": 2, \"iteration\": " + iteration +
@@ -110,12 +102,6 @@ TEST(Driver, SignatureMismatchEndsTheRunUnlessToldOtherwise) {
     MeterRun forced = RunMeter(host, "-f -p 7 -i 1");
     EXPECT_EQ(forced.status, 0);
     EXPECT_EQ(forced.err, refused.err);
-}
-
-TEST(Driver, ReportGoesToTheFileGiven) {
-    MeterRun run = RunMeter(HOST, "-p 7 -i 1 -o file");
-    EXPECT_EQ(run.out, "");
-    EXPECT_EQ(RunFile("file"), RunMeter(HOST, "-p 7 -i 1").out);
 }
 
 TEST(Driver, FullDiskIsToldAndEndsTheRunOnceTextIsLost) {

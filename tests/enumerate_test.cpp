@@ -13,7 +13,6 @@ const std::string HEADER = "PortNum          Type SubType SwitchName       MACAd
 const std::string SW0 = "4000000000          2       0 sw0              02:0a:ee:6b:28:00  b\n";
 const std::string LONG = "5                   3 3000000000 a-name-of-22-characters 02:0a:00:00:00:05  \n"
                          "6                99999       0 a-name-of-22-characters 02:0a:00:00:00:06  c\n";
-const std::string SIMULATED = "Log0 Status: Simulated failure. Message: ";
 
 TEST(Enumerate, TableWithAWrongColumnOrHeaderOrPort) {
     MeterRun run = RunMeter(HOST, "-d 1 -l");

@@ -4,7 +4,6 @@
 
 namespace {
 
-const std::string SIMULATED = "Log0 Status: Simulated failure. Message: ";
 const std::string HOST = "host name=h1 pcpus=1 packages=1 cores=1 llc=7\nswitch sw0\n"
                          "plain switch=sw0 port=7 type=2 client=probe\nplain switch=sw0 port=8 type=2 client=other\n";
 

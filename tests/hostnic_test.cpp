@@ -4,7 +4,6 @@
 
 namespace {
 
-const std::string SIMULATED = "Log0 Status: Simulated failure. Message: ";
 const std::string HOST = "host name=h1 pcpus=1 packages=1 cores=1 llc=7\nswitch sw0\n"
                          "hostnic switch=sw0 port=7 name=a\nhostnic switch=sw0 port=8 name=b\n"
                          "hostnic switch=sw0 port=9 name=c\n";

@@ -10,7 +10,6 @@ std::string Uplink(const std::string &nic, int port = 9) {
 }
 
 const std::string HEAD = "host name=h1 pcpus=2 packages=1 cores=2 llc=7\nswitch sw0\n";
-const std::string SIMULATED = "Log0 Status: Simulated failure. Message: ";
 
 // Two vectors of the NIC, the second with a number of more than 32 bits, around one of another NIC.
 const std::string HOST = HEAD + Uplink("nic1") +

@@ -7,7 +7,6 @@ namespace {
 const std::string HEAD = "host name=h1 pcpus=1 packages=1 cores=1 llc=7\nswitch sw0\n";
 const std::string HOST =
     HEAD + "uplink switch=sw0 port=9 nic=nic0 device=dev.0 txqueues=3 rxqueues=4 filters=2,0,0,1\n";
-const std::string SIMULATED = "Log0 Status: Simulated failure. Message: ";
 
 const std::string TXQ = "field 131 \"nic0\" at=0 width=2 ";
 const std::string RXQ = "field 121 \"nic0\" at=0 width=2 ";
@@ -75,16 +74,6 @@ TEST(PhysNic, LinkFigureThatIsSignedRoundedOrDividedWrongly) {
     nic = RunMeter(HOST + sizes, "-p 9 -t v -i 4").Port(9)["physnic"];
     EXPECT_EQ(nic["rxsize"], 2147483653) << "the low half of 2^32 + 2^31 + 5";
     EXPECT_EQ(nic["txsize"], 0) << "no packets";
-}
-
-TEST(PhysNic, EmptyOrEndlessDeviceText) {
-    std::string none = HEAD + "uplink switch=sw0 port=9 nic=nic0 txqueues=0 rxqueues=0\n";
-    std::string text = RunMeter(none, "-p 9 -t vq -i 1").out;
-    EXPECT_EQ(Count(text, "\"devname\": \"nic0.\""), 1U);
-    EXPECT_EQ(Count(text, "\"txqueue\": { \"count\": 0, \"details\": [],\n    \"active\": 0 }"), 1U);
-    EXPECT_EQ(Count(text, "\"details\": [],\n    \"active\": 0, \"filters\": 0, \"ports\": 0 }"), 1U);
-    MeterRun endless = RunMeter(HOST + "fill 72 \"nic0\" at=0 size=193 byte=0x61\n", "-p 9 -t v -i 1");
-    EXPECT_EQ(endless.Port(9)["physnic"]["devname"], "nic0." + std::string(192, 'a'));
 }
 
 TEST(PhysNic, NodeReadUnasked) {

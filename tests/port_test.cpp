@@ -9,15 +9,7 @@ const std::string HOST = R"(
 host name=h1 pcpus=1 packages=1 cores=1 llc=7
 switch sw0
 plain switch=sw0 port=7 type=2 client=probe
-field 269 "sw0" 7 at=0 width=8 start=1000 rate=1000
-field 269 "sw0" 7 at=8 width=8 start=5000 rate=600000
-field 269 "sw0" 7 at=16 width=8 start=70 rate=3
-field 269 "sw0" 7 at=24 width=8 start=18446744073709551615 rate=500
-field 269 "sw0" 7 at=32 width=8 start=9 rate=150000
-field 269 "sw0" 7 at=72 width=8 start=90000 rate=20
-field 269 "sw0" 7 at=80 width=8 start=80000 rate=30020
-field 269 "sw0" 7 at=88 width=8 start=5 rate=0
-)";
+)" + TRAFFIC;
 
 std::string Messages(const std::string &fault, const std::string &arguments = "-d 1 -i 1 -n 2 -p 7") {
     return RunMeter(HOST + fault + "\n", arguments).err;
@@ -53,21 +45,6 @@ TEST(Port, ClockThatStandsStillIsToldAndDividesByAMillionth) {
     MeterRun run = RunMeter(HOST, "-p 7 -i 0");
     EXPECT_EQ(run.err, "Log0: Time going backwards?: Diff is 0.000000\n");
     EXPECT_EQ(run.Port(7)["txpps"], 0);
-}
-
-TEST(Port, IdentityIsBoundedByItsSpans) {
-    std::string noise = R"(
-fill 266 "sw0" 7 at=148 size=1048 byte=0x61
-field 266 "sw0" 7 at=3310 width=4 start=4294967295
-field 266 "sw0" 7 at=1200 width=4 start=0xffffffbf
-)";
-    nlohmann::json port = RunMeter(HOST + noise, "-p 7 -i 1").Port(7);
-    EXPECT_EQ(port["name"], std::string(1047, 'a'));
-    EXPECT_EQ(port["rxmode"], -1);
-    EXPECT_EQ(port["uplink"], "false");
-    std::string longSwitch = "fill 368 7 at=1032 size=1024 byte=0x62\n";
-    EXPECT_NE(Messages(longSwitch).find("GetPortsInfo 7 Port Status"), std::string::npos)
-        << "the switch's name is a key of the status read, and ends within its record";
 }
 
 TEST(Port, MacComesFromTheFieldOfItsKind) {

@@ -161,12 +161,3 @@ TEST(Recorder, FullDiskLeavesTheOldFileAlone) {
                     " -o full >record 2>err); echo $? $(cat err) $(ls full*) $(cat full.0) >out");
     EXPECT_EQ(RunFile("out"), "1 knf-record: full.0: File too large full.0 old\n");
 }
-
-TEST(Recorder, RefusesWhatItCanNotDo) {
-    for (const char *arguments : {"", "-o s -i x", "-o s -i -1", "-o s -n 0", "-o s extra", "-o a:b", "-o s -q",
-                                  "-o s --dump file", "-o nowhere/s", "--dump script"}) {
-        MeterRun run = Record(HOST, arguments);
-        EXPECT_TRUE(run.status == 1 && run.out.empty() && !run.err.empty()) << arguments;
-    }
-    EXPECT_EQ(Record("switch s", "-o s").status, 1) << "no host to be read";
-}

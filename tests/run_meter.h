@@ -4,6 +4,21 @@
 #include <nlohmann/json.hpp>
 #include <string>
 
+// The head of a message about a failure that a fault line asked for.
+inline const std::string SIMULATED = "Log0 Status: Simulated failure. Message: ";
+
+// Counters of port 7 on switch sw0, each at a rate of its own.
+inline const std::string TRAFFIC = R"(
+field 269 "sw0" 7 at=0 width=8 start=1000 rate=1000
+field 269 "sw0" 7 at=8 width=8 start=5000 rate=600000
+field 269 "sw0" 7 at=16 width=8 start=70 rate=3
+field 269 "sw0" 7 at=24 width=8 start=18446744073709551615 rate=500
+field 269 "sw0" 7 at=32 width=8 start=9 rate=150000
+field 269 "sw0" 7 at=72 width=8 start=90000 rate=20
+field 269 "sw0" 7 at=80 width=8 start=80000 rate=30020
+field 269 "sw0" 7 at=88 width=8 start=5 rate=0
+)";
+
 struct MeterRun {
     int status;  // exit status; 128 + n for a signal
     std::string out;

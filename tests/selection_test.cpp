@@ -14,7 +14,6 @@ const std::string HOST =
     "switch sw2\nvnic switch=sw2 port=21 vm=vm1 model=parlan3\nuplink switch=sw2 port=22 nic=nic2\n"
     "switch none\nplain switch=none port=31 type=10\nswitch empty\n"
     "worldlet NetWdt-Async-500\nworldlet nic0-tx\nworldlet host0-rx\nvector 64 names=nic0\n";
-const std::string SIMULATED = "Log0 Status: Simulated failure. Message: ";
 const std::string UNREAD = "Unable to read port list for ";
 
 std::string Ids(const MeterRun &run) {
