@@ -105,7 +105,7 @@ void PrintOne(const HistoKind &kind, PortHistogram *histo, f32 elapsed, ReportBu
 
 void HistoAlloc(Port *port) {
     for (const HistoKind &kind : KINDS) {
-        port->*kind.record = AllocRecord<PortHistogram>(kind.tag);
+        port->*kind.record = static_cast<PortHistogram *>(AllocClearedOrPanic(1, RecordSize(kind.limits), kind.tag));
     }
     port->histoStarted = 0;
 }

@@ -11,7 +11,7 @@ struct __attribute__((packed)) HistoBucket {
     u64 limit;  // upper; the last bucket of a histogram has none, and its field is not read
 };
 
-// A kind of histogram has fewer buckets than this has room for; the kernel's record ends behind its last one.
+// A kind of histogram may have fewer buckets than this: the kernel's record, and the memory of it, end behind its last.
 struct __attribute__((packed)) PortHistogram {
     u64 min;
     u64 max;
