@@ -1,6 +1,6 @@
 // The stand-in itself: what the other tests rest on.
-#include "corekit/control.h"
-#include "support/corekit.h"
+#include "corekit/entry/control.h"
+#include "interface/corekit.h"
 #include "tests/fixed_clock.h"
 
 #include <cstring>

@@ -1,7 +1,8 @@
 // The format of snapshots and their reader.
-#include "corekit/control.h"
-#include "corekit/snapshot.h"
-#include "corekit/status.h"
+#include "corekit/entry/control.h"
+#include "corekit/entry/param_list.h"
+#include "corekit/node_source.h"
+#include "corekit/snapshot/snapshot.h"
 
 #include <fstream>
 #include <gtest/gtest.h>

@@ -1,7 +1,7 @@
-#include "support/elapsed.h"
-#include "support/log.h"
-#include "support/number.h"
-#include "support/report.h"
+#include "meter/support/elapsed.h"
+#include "meter/support/log.h"
+#include "meter/support/number.h"
+#include "meter/support/report.h"
 
 #include <cstdio>
 #include <fcntl.h>

@@ -1,7 +1,7 @@
 // Feeds texts to the host description: what loads is walked like a host that is recorded, at once and much later;
 // what does not says why and leaves nothing connected.
-#include "corekit/control.h"
-#include "corekit/record.h"
+#include "corekit/entry/control.h"
+#include "corekit/recorder/record.h"
 
 #include <regex>
 #include <sys/time.h>

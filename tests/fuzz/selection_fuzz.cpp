@@ -1,8 +1,8 @@
 // Feeds the first line as the statistics of -t and the rest as the file of -C to the choice of ports, on a host whose
 // ports can't be watched, so that each run ends in Panic and nothing stays.
-#include "corekit/control.h"
-#include "driver/selection.h"
-#include "support/log.h"
+#include "corekit/entry/control.h"
+#include "meter/driver/selection.h"
+#include "meter/support/log.h"
 
 #include <cstdio>
 #include <string>

@@ -1,6 +1,6 @@
 // Feeds files to the reader of snapshots: as they are, and with length and checksum made right, so that what lies
 // behind these is reached. Whatever opens must be served as it stands and can be written and read again.
-#include "corekit/snapshot.h"
+#include "corekit/snapshot/snapshot.h"
 
 #include <cstdlib>
 #include <memory>

@@ -1,0 +1,18 @@
+// The lines that tell from outside what a run asked of the library: the journal of writes, the trace of all calls, and
+// the same lines kept in memory for tests. Each line leaves with one write, so that it survives a kill.
+#pragma once
+
+#include "corekit/entry/param_list.h"
+
+#include <string>
+#include <vector>
+
+// True when some reader wants a line of this call. Cheap; callers build the line only then.
+bool JournalWanted(bool isSet);
+void JournalLine(bool isSet, std::string line);
+
+void JournalRecord(bool on);  // starts with an empty record
+const std::vector<std::string> &JournalRecorded();
+
+// "NAME [NODE] KEYS... [: INPUT...] -> 0xSTATUS"
+std::string CallText(const char *name, const uint32_t *node, const Params &keys, const Params *input, KnfStatus status);

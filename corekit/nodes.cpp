@@ -1,0 +1,38 @@
+#include "corekit/nodes.h"
+
+namespace {
+
+constexpr u32 HistogramSize(u32 limits) {
+    return histogram::BucketCount(limits + 1).offset;
+}
+
+struct RecordSize {
+    u32 node;
+    u32 size;
+};
+// clang-format off
+constexpr RecordSize SIZES[] = {
+    {NODE_IPV4, 240}, {NODE_TCP, 728}, {NODE_UDP, 112}, {NODE_IPV6, 3328}, {NODE_NIC_PROPERTIES, 1252},
+    {NODE_NIC_STATS, 4296}, {NODE_RXQ_INFO, 12}, {NODE_RXQ_FILTER, 36}, {NODE_TXQ_INFO, 12}, {NODE_TXQ_STATS, 20},
+    {NODE_PORT_STATUS, 3316}, {NODE_PORT_STATS, 160}, {NODE_PARLAN2, 112}, {NODE_TX_WORLDLET, 20}, {NODE_COALESCE, 68},
+    {NODE_COALESCE_2, 68}, {NODE_COALESCE_RX, 36}, {NODE_COALESCE_TX, 32}, {NODE_COALESCE_TXCOMP, 24},
+    {NODE_CLUSTERS_IN, HistogramSize(14)}, {NODE_CLUSTERS_OUT, HistogramSize(14)}, {NODE_SIZES_IN, HistogramSize(11)},
+    {NODE_SIZES_OUT, HistogramSize(11)}, {NODE_INTERVALS_IN, HistogramSize(18)},
+    {NODE_INTERVALS_OUT, HistogramSize(18)}, {NODE_PARLAN3_TX, 140}, {NODE_PARLAN3_RX, 128}, {NODE_PARLAN3_QUEUE, 16},
+    {NODE_PORT_TYPE, 2056}, {NODE_WORLD_CARTEL, 4}, {NODE_CONFIG_OPTION, 1572}, {NODE_TOPOLOGY, 36},
+    {NODE_PCPU_INFO, 200}, {NODE_GROUP_LEADER, 4}, {NODE_CARTEL_GROUP, 8}, {NODE_VCPU_TIMES, 120},
+    {NODE_VCPU_EVENTS, 64}, {NODE_VCPU_HISTO, 352}, {NODE_VCPU_MIGRATIONS, 8}, {NODE_VCPU_L3, 8},
+    {NODE_PCPU_STATS, 160}, {NODE_VECTOR_STATS, 16}, {NODE_TIME, 8}, {NODE_WORLDLET_STATS, 1460},
+};
+// clang-format on
+
+}  // namespace
+
+u32 NodeRecordSize(u32 node) {
+    for (const RecordSize &record : SIZES) {
+        if (record.node == node) {
+            return record.size;
+        }
+    }
+    return 0;
+}

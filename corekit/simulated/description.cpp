@@ -1,0 +1,409 @@
+#include "corekit/simulated/description.h"
+
+#include "corekit/simulated/host_nodes.h"
+
+#include <sstream>
+#include <utility>
+
+namespace {
+
+constexpr i64 MAX_COUNT = 10000000;
+constexpr i64 MAX_RECORD = 1 << 20;
+
+void RequireNew(Line *line, bool exists, const std::string &what) {
+    if (exists) {
+        Fail(line, what + " is there already: expected one that no line above has");
+    }
+}
+
+void ApplyHost(Line *line) {
+    HostSpec spec;
+    spec.name = TakeText(line, "name", "host");
+    spec.pcpus = TakeNumber(line, "pcpus", 8, 0, 65536);
+    spec.packages = TakeNumber(line, "packages", 2, 0, 65536);
+    spec.cores = TakeNumber(line, "cores", 4, 0, 65536);
+    spec.llc = TakeNumber(line, "llc", 2, 0, MAX_ID);
+    std::string signature = TakeText(line, "signature", HOST_SIGNATURE);
+    if (Complete(line)) {
+        line->host->signature = signature;
+        NodesAddHost(line->host, spec);
+    }
+}
+
+void ApplyPcpu(Line *line) {
+    std::string range = TakePlain(line, "a pcpu number or a range such as 0..7").text;
+    size_t dots = range.find("..");
+    i64 last = static_cast<i64>(line->host->pcpus.size()) - 1;
+    i64 from = CheckNumber(line, "pcpu", range.substr(0, dots), 0, last);
+    i64 to = dots == std::string::npos ? from : CheckNumber(line, "pcpu", range.substr(dots + 2), from, last);
+    i64 busy = TakePerMille(line, "busy");
+    i64 worldlet = TakePerMille(line, "worldlet");
+    for (i64 pcpu = from; Complete(line) && pcpu <= to; pcpu++) {
+        NodesSetPcpu(line->host, pcpu, busy, worldlet);
+    }
+}
+
+void ApplySelf(Line *line) {
+    i64 used = TakePerMille(line, "used");
+    if (Complete(line)) {
+        line->host->self->value[USED] = used;
+    }
+}
+
+void ApplyStack(Line *line) {
+    i64 tx = TakeRate(line, "tx");
+    i64 rx = TakeRate(line, "rx");
+    if (Complete(line)) {
+        NodesSetStack(line->host, tx, rx);
+    }
+}
+
+void ApplySwitch(Line *line) {
+    std::string name = TakePlain(line, "a switch name").text;
+    RequireNew(line, line->host->lists.contains(HostKey(NODE_SWITCH_PORTS, name)), "switch " + Quoted(name));
+    if (Complete(line)) {
+        NodesAddSwitch(line->host, name);
+    }
+}
+
+void ApplyVm(Line *line) {
+    VmSpec spec;
+    spec.name = TakePlain(line, "a VM name").text;
+    spec.leader = TakeNumber(line, "leader", std::nullopt, 1, MAX_ID - 2);
+    spec.vcpus = TakeNumber(line, "vcpus", 1, 0, 999);
+    spec.used = TakePerMille(line, "used");
+    spec.ready = TakePerMille(line, "ready");
+    spec.costop = TakePerMille(line, "costop");
+    RequireNew(line, line->host->vms.contains(spec.name), "VM " + Quoted(spec.name));
+    RequireNew(line, line->host->instances.contains(HostKey(NODE_WORLD_CARTEL, spec.leader)),
+               "leader " + std::to_string(spec.leader));
+    if (Complete(line)) {
+        NodesAddVm(line->host, spec);
+    }
+}
+
+// What all ports have; their own lines add the rest.
+PortSpec TakePort(Line *line, i64 type) {
+    PortSpec spec = {};
+    spec.type = type;
+    spec.switchName = TakeText(line, "switch");
+    spec.port = TakeNumber(line, "port", std::nullopt, 1, MAX_ID);
+    spec.tx = TakeRate(line, "tx");
+    spec.rx = TakeRate(line, "rx");
+    spec.size = TakeNumber(line, "size", 512, 0, 1000000);
+    spec.errors = TakeRate(line, "errors");
+    spec.flags = 1;
+    if (!line->host->lists.contains(HostKey(NODE_SWITCH_PORTS, spec.switchName))) {
+        Fail(line, "switch " + Quoted(spec.switchName) + " unknown: expected the name of a switch line above");
+    }
+    RequireNew(line, line->host->instances.contains(HostKey(NODE_PORT_TYPE, spec.port)),
+               "port " + std::to_string(spec.port));
+    return spec;
+}
+
+void ApplyVnic(Line *line) {
+    PortSpec spec = TakePort(line, PORT_VNIC);
+    spec.client = TakeText(line, "vm");
+    std::string model = TakeText(line, "model");
+    spec.scheme = TakeNumber(line, "scheme", 0, 0, MAX_ID);
+    if (model == "parlan2" || model == "parlan3") {
+        spec.subType = model == "parlan2" ? MODEL_PARLAN2 : MODEL_PARLAN3;
+    } else if (std::optional<i64> number = ParseSigned(model); number && *number >= 0 && *number <= MAX_ID) {
+        spec.subType = *number;
+    } else {
+        Fail(line, "model= " + Quoted(model) + ": expected parlan2, parlan3 or a number");
+    }
+    auto vm = line->host->vms.find(spec.client);
+    if (vm == line->host->vms.end()) {
+        return Fail(line, "vm " + Quoted(spec.client) + " unknown: expected the name of a vm line above");
+    }
+    spec.leader = vm->second->value[LEADER];
+    if (Complete(line)) {
+        NodesAddPort(line->host, spec);
+    }
+}
+
+void ApplyUplink(Line *line) {
+    PortSpec port = TakePort(line, PORT_UPLINK);
+    port.flags |= PORT_FLAG_UPLINK;
+    NicSpec nic;
+    nic.name = port.client = TakeText(line, "nic");
+    nic.device = TakeText(line, "device", "");
+    nic.txQueues = TakeNumber(line, "txqueues", 1, 0, 1024);
+    i64 rxQueues = TakeNumber(line, "rxqueues", 1, 0, 1024);
+    for (const std::string &count : SplitCommas(TakeText(line, "filters", ""))) {
+        nic.filters.push_back(CheckNumber(line, "filters=", count, 0, 1024));
+    }
+    if (nic.filters.size() > static_cast<size_t>(rxQueues)) {
+        Fail(line, "filters= is too long: expected at most " + std::to_string(rxQueues) + " counts, one a queue");
+    }
+    nic.filters.resize(static_cast<size_t>(rxQueues));
+    RequireNew(line, line->host->instances.contains(HostKey(NODE_NIC_PROPERTIES, nic.name)), "nic " + Quoted(nic.name));
+    if (Complete(line)) {
+        nic.port = port.port;
+        nic.tx = port.tx;
+        nic.rx = port.rx;
+        nic.size = port.size;
+        nic.errors = port.errors;
+        NodesAddPort(line->host, port);
+        NodesAddNic(line->host, nic);
+    }
+}
+
+void ApplyHostNic(Line *line) {
+    PortSpec spec = TakePort(line, PORT_HOST_STACK);
+    spec.client = TakeText(line, "name");
+    if (Complete(line)) {
+        NodesAddPort(line->host, spec);
+    }
+}
+
+void ApplyPlain(Line *line) {
+    PortSpec spec = TakePort(line, TakeNumber(line, "type", std::nullopt, 0, MAX_ID));
+    spec.client = TakeText(line, "client", "");
+    if (Complete(line)) {
+        NodesAddPort(line->host, spec);
+    }
+}
+
+void ApplyWorldlet(Line *line) {
+    WorldletSpec spec;
+    spec.name = TakePlain(line, "a worldlet name").text;
+    spec.used = TakePerMille(line, "used");
+    spec.ready = TakePerMille(line, "ready");
+    spec.wait = TakePerMille(line, "wait");
+    spec.pcpu = TakeNumber(line, "pcpu", 0, 0, MAX_ID);
+    spec.vcpu = TakeNumber(line, "vcpu", 0, 0, MAX_ID);
+    spec.worldlet = TakeNumber(line, "worldlet", MAX_ID, 0, MAX_ID);
+    RequireNew(line, line->host->instances.contains(HostKey(NODE_WORLDLET_STATS, spec.name)),
+               "worldlet " + Quoted(spec.name));
+    if (Complete(line)) {
+        NodesAddWorldlet(line->host, spec);
+    }
+}
+
+void ApplyVector(Line *line) {
+    i64 vector = CheckNumber(line, "vector", TakePlain(line, "a vector number").text, 0, MAX_I64);
+    Params names;
+    for (const std::string &name : SplitCommas(TakeText(line, "names", ""))) {
+        names.push_back(ParamOf(name));
+    }
+    i64 rate = TakeRate(line, "rate");
+    i64 time = TakeRate(line, "time");
+    RequireNew(line, line->host->lists.contains(HostKey(NODE_VECTOR_NAMES, vector)),
+               "vector " + std::to_string(vector));
+    if (Complete(line)) {
+        NodesAddVector(line->host, vector, names, rate, time);
+    }
+}
+
+void ApplyRecord(Line *line) {
+    u32 node = TakeNode(line);
+    Params keys = TakeKeys(line);
+    i64 size = TakeNumber(line, "size", NodeRecordSize(node), 1, MAX_RECORD);
+    if (size == 0) {
+        Fail(line, "no size= for a node without a record of its own: expected size=<bytes>");
+    }
+    if (Complete(line)) {
+        HostAddNoise(line->host, HostKey(node, keys), static_cast<u32>(size));
+    }
+}
+
+// Takes node, keys and at= of a line that changes `width` bytes of a record, and adds the patch.
+void AddPatch(Line *line, Instance *instance, Patch patch, i64 width) {
+    i64 at = TakeNumber(line, "at", std::nullopt, 0, MAX_RECORD);
+    if (at + width > static_cast<i64>(instance->size)) {
+        Fail(line, "at= goes past the record: expected " + std::to_string(width) + " bytes within " +
+                       std::to_string(instance->size));
+    }
+    if (!Complete(line)) {
+        return;
+    }
+    patch.offset = static_cast<u32>(at);
+    patch.width = static_cast<u32>(width);
+    if (instance->patches == nullptr) {
+        instance->patches = std::make_unique<std::vector<Patch>>();
+    }
+    instance->patches->push_back(std::move(patch));
+}
+
+Instance *TakeInstance(Line *line) {
+    u32 node = TakeNode(line);
+    auto found = line->host->instances.find(HostKey(node, TakeKeys(line)));
+    if (found == line->host->instances.end()) {
+        Fail(line, "no such instance: expected node and keys of an entity or a record line above");
+        return nullptr;
+    }
+    return &found->second;
+}
+
+u64 FieldValue(Line *line, const std::string &text) {
+    std::optional<u64> value = ParseNumber(text);
+    if (!value) {
+        Fail(line, "value " + Quoted(text) + ": expected a number of 64 bits");
+    }
+    return value.value_or(0);
+}
+
+// SEC:VALUE or SEC:VALUE:RATE
+Patch::Course ParseThen(Line *line, const std::string &text, const Patch::Course &before) {
+    size_t first = text.find(':');
+    size_t second = first == std::string::npos ? first : text.find(':', first + 1);
+    if (first == std::string::npos) {
+        Fail(line, "then= " + Quoted(text) + ": expected SECOND:VALUE or SECOND:VALUE:RATE");
+        return before;
+    }
+    i64 from = CheckNumber(line, "then=", text.substr(0, first), 0, 1000000000) * 1000000;
+    if (from < before.from) {
+        Fail(line, "then= " + Quoted(text) + ": expected ascending seconds");
+    }
+    u64 start = FieldValue(line, text.substr(first + 1, second - first - 1));
+    bool moves = second != std::string::npos;
+    return {from, start, moves ? CheckNumber(line, "then=", text.substr(second + 1), MIN_I64, MAX_I64) : 0};
+}
+
+void ApplyField(Line *line) {
+    Instance *instance = TakeInstance(line);
+    if (instance == nullptr) {
+        return;
+    }
+    i64 width = TakeNumber(line, "width", std::nullopt, 1, 8);
+    if (width != 1 && width != 2 && width != 4 && width != 8) {
+        Fail(line, "width=" + std::to_string(width) + ": expected 1, 2, 4 or 8");
+    }
+    u64 start = FieldValue(line, TakeText(line, "start"));
+    Patch patch = {0, 0, {{0, start, TakeNumber(line, "rate", 0, MIN_I64, MAX_I64)}}, {}};
+    while (std::optional<Word> then = Take(line, "then")) {
+        patch.courses.push_back(ParseThen(line, then->text, patch.courses.back()));
+    }
+    AddPatch(line, instance, std::move(patch), width);
+}
+
+void ApplyText(Line *line) {
+    if (Instance *instance = TakeInstance(line)) {
+        std::string value = TakeText(line, "value");
+        value += '\0';
+        i64 width = static_cast<i64>(value.size());
+        AddPatch(line, instance, {0, 0, {}, std::move(value)}, width);
+    }
+}
+
+void ApplyFill(Line *line) {
+    if (Instance *instance = TakeInstance(line)) {
+        i64 size = TakeNumber(line, "size", std::nullopt, 1, MAX_RECORD);
+        i64 byte = TakeNumber(line, "byte", std::nullopt, 0, 255);
+        AddPatch(line, instance, {0, 0, {}, std::string(static_cast<size_t>(size), static_cast<char>(byte))}, size);
+    }
+}
+
+void ApplyList(Line *line) {
+    u32 node = TakeNode(line);
+    Params keys = TakeKeys(line);
+    if (TakePlain(line, "= and the entries").text != "=") {
+        Fail(line, "no =: expected = and the entries");
+    }
+    Params entries;
+    while (AtPlain(*line)) {
+        entries.push_back(ToParam(line, TakePlain(line, "an entry"), "entry"));
+    }
+    if (Complete(line)) {
+        line->host->lists[HostKey(node, keys)] = std::move(entries);
+    }
+}
+
+void ApplyRemove(Line *line) {
+    u32 node = TakeNode(line);
+    std::string key = HostKey(node, TakeKeys(line));
+    if (Complete(line) && line->host->instances.erase(key) + line->host->lists.erase(key) == 0) {
+        Fail(line, "no such instance or list: expected node and keys of a line above");
+    }
+}
+
+struct Keyword {
+    const char *name;
+    void (*apply)(Line *line);  // null: the line is the reader's of the faults
+};
+constexpr Keyword KEYWORDS[] = {
+    {"host", ApplyHost},       {"pcpu", ApplyPcpu},     {"self", ApplySelf},         {"stack", ApplyStack},
+    {"switch", ApplySwitch},   {"vm", ApplyVm},         {"vnic", ApplyVnic},         {"uplink", ApplyUplink},
+    {"hostnic", ApplyHostNic}, {"plain", ApplyPlain},   {"worldlet", ApplyWorldlet}, {"vector", ApplyVector},
+    {"record", ApplyRecord},   {"field", ApplyField},   {"text", ApplyText},         {"fill", ApplyFill},
+    {"list", ApplyList},       {"remove", ApplyRemove}, {"fault", nullptr},
+};
+
+const Keyword *FindKeyword(const std::string &name) {
+    for (const Keyword &keyword : KEYWORDS) {
+        if (name == keyword.name) {
+            return &keyword;
+        }
+    }
+    return nullptr;
+}
+
+void ApplyLine(Line *line, const LineReader &apply) {
+    std::optional<Word> repeats = Take(line, "count");
+    if (!repeats) {
+        return apply(line);
+    }
+    i64 count = CheckNumber(line, "count=", repeats->text, 1, MAX_COUNT);
+    for (i64 i = 0; i < count && line->problem.empty(); i++) {
+        Line one = {line->host, line->words, {}, line->known};
+        Expand(&one, i);
+        if (one.problem.empty()) {
+            apply(&one);
+        }
+        line->problem = std::move(one.problem);
+    }
+}
+
+void LoadLine(Line *line, bool isFirst, const LineReader &fault) {
+    std::string name = TakePlain(line, "a keyword").text;
+    const Keyword *keyword = FindKeyword(name);
+    if (keyword == nullptr || (line->host == nullptr && keyword->apply != nullptr)) {
+        std::string names;
+        for (const Keyword &known : KEYWORDS) {
+            names += (names.empty() ? "" : ", ") + std::string(known.name);
+        }
+        return Fail(line, "keyword " + Quoted(name) + ": expected " + (line->host == nullptr ? "fault" : names));
+    }
+    if (line->host != nullptr && isFirst != (keyword->apply == ApplyHost)) {
+        return Fail(line, "keyword " + Quoted(name) + ": expected one host line, ahead of all others");
+    }
+    ApplyLine(line, keyword->apply != nullptr ? keyword->apply : fault);
+}
+
+bool LoadText(const std::string &text, const char *file, Host *host, const LineReader &fault, std::string *error) {
+    std::istringstream stream(text);
+    bool isFirst = true;
+    int number = 0;
+    std::string problem;
+    for (std::string source; problem.empty() && std::getline(stream, source);) {
+        number++;
+        Line line = {host, {}, {}, {}};
+        SplitWords(&line, source);
+        if (line.problem.empty() && !line.words.empty()) {
+            LoadLine(&line, isFirst, fault);
+            isFirst = false;
+        }
+        problem = line.problem;
+    }
+    if (problem.empty() && isFirst && host != nullptr) {
+        problem = "no host: expected a host line";
+    }
+    if (!problem.empty()) {
+        *error = std::string(file) + ":" + std::to_string(number) + ": " + problem;
+    }
+    return problem.empty();
+}
+
+}  // namespace
+
+bool DescriptionLoad(const std::string &text, const char *file, Host *host, const LineReader &fault,
+                     std::string *error) {
+    host->loadedAt = HostClock();
+    return LoadText(text, file, host, fault, error);
+}
+
+bool DescriptionFaults(const std::string &text, const char *file, const LineReader &fault, std::string *error) {
+    return LoadText(text, file, nullptr, fault, error);
+}

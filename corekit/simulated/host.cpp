@@ -1,0 +1,298 @@
+#include "corekit/simulated/host.h"
+
+#include <algorithm>
+#include <array>
+#include <cstring>
+#include <sys/time.h>
+#include <utility>
+
+namespace {
+
+constexpr i64 SECOND = 1000000;
+constexpr size_t NOISE_SPAN = 4096;
+
+u64 Mix(u64 value) {
+    value += 0x9e3779b97f4a7c15;
+    value = (value ^ value >> 30) * 0xbf58476d1ce4e5b9;
+    value = (value ^ value >> 27) * 0x94d049bb133111eb;
+    return value ^ value >> 31;
+}
+
+const std::array<char, 2 * NOISE_SPAN> &Noise() {
+    static const auto noise = [] {
+        std::array<char, 2 * NOISE_SPAN> bytes;
+        for (size_t i = 0; i < bytes.size(); i++) {
+            bytes[i] = static_cast<char>(Mix(i) % 255 + 1);
+        }
+        return bytes;
+    }();
+    return noise;
+}
+
+void AppendKey(std::string *key, i64 number) {
+    *key += 'i';
+    key->append(reinterpret_cast<const char *>(&number), sizeof number);
+}
+
+void AppendKey(std::string *key, const std::string &text) {
+    *key += 's';
+    key->append(text.c_str(), text.size() + 1);
+}
+
+void StartKey(std::string *key, u32 node) {
+    key->assign(reinterpret_cast<const char *>(&node), sizeof node);
+}
+
+void AppendKeys(std::string *key, const Params &keys) {
+    for (const KnfParamRec &param : keys) {
+        param.isText ? AppendKey(key, param.text) : AppendKey(key, static_cast<i64>(param.number));
+    }
+}
+
+// The key of a look-up, in a buffer that is used again each time.
+std::string_view LookUpKey(u32 node, const Params &keys) {
+    static thread_local std::string key;
+    StartKey(&key, node);
+    AppendKeys(&key, keys);
+    return key;
+}
+
+u32 SeedOf(std::string_view key) {
+    u64 seed = key.size();
+    for (char c : key) {
+        seed = Mix(seed ^ static_cast<unsigned char>(c));
+    }
+    return static_cast<u32>(seed);
+}
+
+// rate x elapsed, exact, cut towards zero.
+u64 Moved(i64 rate, i64 factor, i64 divisor, i64 elapsed) {
+    return static_cast<u64>(static_cast<__int128>(rate) * factor * elapsed / (static_cast<__int128>(divisor) * SECOND));
+}
+
+void Store(char *record, u32 offset, u32 width, u64 value) {
+    memcpy(record + offset, &value, width);
+}
+
+i64 Collected(const Tracker &tracker, i64 elapsed) {
+    return tracker.collected + (tracker.running ? elapsed - tracker.since : 0);
+}
+
+struct Moment {
+    i64 clock;    // of the host's time of day
+    i64 elapsed;  // since the host was loaded
+};
+
+Moment Now(const Host &host) {
+    i64 clock = HostClock();
+    return {clock, clock - host.loadedAt};
+}
+
+void FillFields(const Instance &instance, const Moment &now, char *record) {
+    const Entity &entity = *instance.entity;
+    const Tracker *tracker = instance.tracker;
+    i64 elapsed = tracker != nullptr ? Collected(*tracker, now.elapsed) : now.elapsed;
+    u64 total = 0;
+    u64 index = 0;
+    for (const Field &field : instance.kind->fields) {
+        i64 slot = entity.value[field.slot];
+        u64 value = 0;
+        switch (field.motion) {
+        case COUNT:
+            value = Moved(slot, field.factor, field.divisor, elapsed);
+            if (tracker == nullptr || !tracker->fromZero) {
+                value += Mix(instance.seed + (index << 32)) % 1000000007 + 1;
+            }
+            total += value;
+            break;
+        case SOME:
+            value = elapsed > 0 ? static_cast<u64>(slot * field.factor / field.divisor) : 0;
+            break;
+        case LEVEL:
+            value = static_cast<u64>(slot * field.factor / field.divisor);
+            break;
+        case TOTAL:
+            value = total;
+            break;
+        case SECONDS:
+            value = static_cast<u64>(now.clock / SECOND);
+            break;
+        case NANOSECONDS:
+            value = static_cast<u64>(now.clock % SECOND * 1000);
+            break;
+        }
+        Store(record, field.at.offset, field.at.width, value);
+        index++;
+    }
+}
+
+void FillTexts(const Instance &instance, char *record) {
+    for (const TextField &field : instance.kind->texts) {
+        const std::string *text = instance.entity->text[field.slot];
+        size_t length = text != nullptr ? std::min<size_t>(text->size(), field.at.width - 1) : 0;
+        if (length > 0) {
+            text->copy(record + field.at.offset, length);
+        }
+        record[field.at.offset + length] = 0;
+    }
+}
+
+void ApplyPatch(const Patch &patch, i64 elapsed, char *record) {
+    if (patch.courses.empty()) {
+        std::copy(patch.bytes.begin(), patch.bytes.end(), record + patch.offset);
+        return;
+    }
+    const Patch::Course *course = &patch.courses[0];
+    for (const Patch::Course &next : patch.courses) {
+        course = next.from <= elapsed ? &next : course;
+    }
+    Store(record, patch.offset, patch.width, course->start + Moved(course->rate, 1, 1, elapsed - course->from));
+}
+
+KnfStatus Get(void *context, u32 node, const Params &keys, void *buffer, u32 size) {
+    const Host &host = *static_cast<const Host *>(context);
+    auto found = host.instances.find(LookUpKey(node, keys));
+    if (found == host.instances.end()) {
+        return STATUS_NOT_FOUND;
+    }
+    const Instance &instance = found->second;
+    if (instance.size != size) {
+        return STATUS_BAD_SIZE;
+    }
+    Moment now = Now(host);
+    char *record = static_cast<char *>(buffer);
+    const char *noise = Noise().data() + Mix(instance.seed ^ static_cast<u64>(now.elapsed)) % NOISE_SPAN;
+    for (u32 done = 0; done < size; done += NOISE_SPAN) {
+        memcpy(record + done, noise, std::min<size_t>(size - done, NOISE_SPAN));
+    }
+    if (instance.kind != nullptr) {
+        FillFields(instance, now, record);
+        FillTexts(instance, record);
+    }
+    if (instance.patches != nullptr) {
+        for (const Patch &patch : *instance.patches) {
+            ApplyPatch(patch, now.elapsed, record);
+        }
+    }
+    return STATUS_OK;
+}
+
+KnfStatus List(void *context, u32 node, const Params &keys, Params *entries) {
+    const Host &host = *static_cast<const Host *>(context);
+    auto found = host.lists.find(LookUpKey(node, keys));
+    if (found == host.lists.end()) {
+        return STATUS_NOT_FOUND;
+    }
+    *entries = found->second;
+    return STATUS_OK;
+}
+
+// A histogram that is started again goes on; a reset keeps it running or stopped.
+void Track(Tracker *tracker, i64 elapsed, bool running, bool reset) {
+    tracker->collected = reset ? 0 : Collected(*tracker, elapsed);
+    tracker->since = elapsed;
+    tracker->running = running;
+}
+
+KnfStatus SetTrackHistos(Host *host, const Params &input, void *result, u32 size) {
+    if (input.size() != 1 || input[0].isText || (input[0].number != 0 && input[0].number != 1)) {
+        return STATUS_BAD_PARAM;
+    }
+    if (result != nullptr) {
+        memset(result, 0, size);
+    }
+    Track(&host->vcpuHistos, Now(*host).elapsed, input[0].number != 0, false);
+    host->trackOption->text[NAME] = HostText(host, std::to_string(input[0].number));
+    return STATUS_OK;
+}
+
+KnfStatus SetPortHistogram(Host *host, const HistogramNodes &nodes, const Params &keys, const Params &input) {
+    if (input.size() != 2 || (input[1].text != "input" && input[1].text != "output")) {
+        return STATUS_BAD_PARAM;
+    }
+    auto found = host->instances.find(LookUpKey(input[1].text == "input" ? nodes.input : nodes.output, keys));
+    if (found == host->instances.end() || found->second.tracker == nullptr) {
+        return STATUS_NOT_FOUND;
+    }
+    Tracker *tracker = found->second.tracker;
+    const std::string &operation = input[0].text;
+    if (operation != "start" && operation != "reset" && operation != "stop") {
+        return STATUS_BAD_PARAM;
+    }
+    bool running = operation == "start" || (operation == "reset" && tracker->running);
+    Track(tracker, Now(*host).elapsed, running, operation == "reset");
+    return STATUS_OK;
+}
+
+KnfStatus Set(void *context, u32 node, const Params &keys, const Params &input, void *result, u32 size) {
+    Host *host = static_cast<Host *>(context);
+    if (node == NODE_CONFIG_OPTION_SET && keys.size() == 2 && keys[0].text == "Cpu" && keys[1].text == "TrackHistos") {
+        return SetTrackHistos(host, input, result, size);
+    }
+    for (const HistogramNodes &nodes : HISTOGRAM_NODES) {
+        if (nodes.control == node) {
+            return SetPortHistogram(host, nodes, keys, input);
+        }
+    }
+    return STATUS_NOT_WRITABLE;
+}
+
+const char *Signature(void *context) {
+    return static_cast<const Host *>(context)->signature.c_str();
+}
+
+}  // namespace
+
+i64 HostClock() {
+    timeval now;
+    gettimeofday(&now, nullptr);
+    return static_cast<i64>(now.tv_sec) * SECOND + static_cast<i64>(now.tv_usec);
+}
+
+std::string HostKey(u32 node, const Params &keys) {
+    std::string key;
+    StartKey(&key, node);
+    AppendKeys(&key, keys);
+    return key;
+}
+
+std::string HostKey(u32 node) {
+    return HostKey(node, Params());
+}
+
+std::string HostKey(u32 node, i64 first) {
+    std::string key = HostKey(node);
+    AppendKey(&key, first);
+    return key;
+}
+
+std::string HostKey(u32 node, const std::string &first) {
+    std::string key = HostKey(node);
+    AppendKey(&key, first);
+    return key;
+}
+
+std::string HostKey(u32 node, const std::string &first, i64 second) {
+    std::string key = HostKey(node, first);
+    AppendKey(&key, second);
+    return key;
+}
+
+const std::string *HostText(Host *host, const std::string &text) {
+    return &*host->texts.insert(text).first;
+}
+
+void HostAdd(Host *host, std::string key, const RecordKind *kind, const Entity *entity, Tracker *tracker) {
+    u32 seed = SeedOf(key);
+    host->instances.insert_or_assign(std::move(key),
+                                     Instance{kind, entity, tracker, NodeRecordSize(kind->node), seed, nullptr});
+}
+
+void HostAddNoise(Host *host, std::string key, u32 size) {
+    u32 seed = SeedOf(key);
+    host->instances.insert_or_assign(std::move(key), Instance{nullptr, nullptr, nullptr, size, seed, nullptr});
+}
+
+NodeSource HostSource(Host *host) {
+    return {host, Get, List, Set, Signature};
+}

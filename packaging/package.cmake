@@ -1,0 +1,39 @@
+# What is installed, and the two Debian packages: the program, and the stand-in with the recorder. A host that has the
+# library of its own installs the first alone, so that it never gets ours.
+include(GNUInstallDirs)
+
+install(TARGETS lan-meter RUNTIME DESTINATION ${CMAKE_INSTALL_SBINDIR} COMPONENT meter)
+install(FILES docs/man/lan-meter.8 DESTINATION ${CMAKE_INSTALL_MANDIR}/man8 COMPONENT meter)
+install(FILES docs/report.schema.json DESTINATION ${CMAKE_INSTALL_DATADIR}/lan-meter COMPONENT meter)
+install(FILES docs/report.md docs/recipes.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT meter)
+install(FILES packaging/lan-meter.bash DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions
+  RENAME lan-meter COMPONENT meter)
+
+install(TARGETS corekit LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT corekit)
+install(TARGETS knf-record RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT corekit)
+install(FILES docs/man/knf-record.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 COMPONENT corekit)
+install(FILES docs/host-description.md docs/snapshot-format.md
+  DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/lan-meter-corekit COMPONENT corekit)
+
+set(CPACK_GENERATOR DEB)
+set(CPACK_PACKAGE_VENDOR "lan-meter maintainers")
+set(CPACK_PACKAGE_CONTACT "lan-meter maintainers <maintainers@localhost>")
+set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
+set(CPACK_STRIP_FILES ON)
+set(CPACK_COMPONENTS_ALL meter corekit)
+set(CPACK_DEB_COMPONENT_INSTALL ON)
+set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
+set(CPACK_DEBIAN_METER_PACKAGE_NAME lan-meter)
+set(CPACK_DEBIAN_METER_PACKAGE_SECTION net)
+set(CPACK_DEBIAN_METER_PACKAGE_DEPENDS "libc6 (>= 2.36)")
+set(CPACK_DEBIAN_METER_PACKAGE_SUGGESTS "lan-meter-corekit, jq")
+set(CPACK_COMPONENT_METER_DESCRIPTION "Network statistics of a hypervisor host's virtual switches
+ Reports packet, byte and error rates of switch ports, and what stands behind
+ each port, as one JSON document. Needs the host's libcorekit.so.")
+set(CPACK_DEBIAN_COREKIT_PACKAGE_NAME lan-meter-corekit)
+set(CPACK_DEBIAN_COREKIT_PACKAGE_SECTION libs)
+set(CPACK_DEBIAN_COREKIT_PACKAGE_DEPENDS "libc6 (>= 2.36), libstdc++6 (>= 12), libgcc-s1")
+set(CPACK_COMPONENT_COREKIT_DESCRIPTION "Stand-in for a host's libcorekit.so, and its recorder
+ Plays a simulated host where the hypervisor's own library is absent, and
+ records and serves snapshots. Not for a host that has the library.")
+include(CPack)
