@@ -9,6 +9,7 @@
 #include "meter/driver/watched.h"
 #include "meter/ports/enumerate.h"
 #include "meter/support/log.h"
+#include "meter/support/run.h"
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -31,7 +32,7 @@ void ReserveStandardDescriptors() {
 
 // Where samples come from, and how many: a replay goes on as long as there are snapshots.
 void OpenSource(Settings *settings) {
-    if (settings->cacheSpec == nullptr) {
+    if (cacheEnabled == 0) {
         HckSyscall_Init(1, 0, 0);
         InstallSignalHandlers();
         return;

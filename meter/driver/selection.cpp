@@ -142,7 +142,7 @@ void AddConfiguredPorts(const char *cfgFile, PortPrefs cmdPrefs) {
 }
 
 // The bits that a letter adds; 0 for a bad one.
-PortPrefs LetterBits(char letter) {
+PortPrefs LetterBits(signed char letter) {
     switch (letter) {
     case 'c':
         return PREF_COALESCE;
@@ -187,7 +187,7 @@ PortPrefs CommandPrefs(const char *typeSpec) {
 
 void ParseStatsSpec(const char *spec, PortPrefs *prefs) {
     for (i32 i = 0; spec != nullptr && spec[i] != '\0'; i++) {
-        char letter = spec[i];
+        auto letter = static_cast<signed char>(spec[i]);
         PortPrefs bits = LetterBits(letter);
         if (bits == 0) {
             LogMsg(2, "Bad option (%c:%x) supplied at %d idx\n", letter, static_cast<u32>(i32{letter}), i);

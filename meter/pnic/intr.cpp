@@ -50,19 +50,17 @@ void FillSlot(KnfParamList names, NameSlot *slot) {
 
 // Lists one vector; false, logged, when its names can't be had.
 bool AddVector(KnfParamList keys, i64 vector, NameSlot *slot) {
-    KnfStatus status = keys != nullptr ? KNF_ParamListAddInt(keys, vector) : KNF_FAILURE;
-    if (status != 0) {
-        LogStatus(0, status, "Unable to add param for interrupt %Ld\n", vector);
+    LocalList names;
+    VaryingKey key(keys, vector);
+    if (key.status != 0) {
+        LogStatus(0, key.status, "Unable to add param for interrupt %Ld\n", vector);
         return false;
     }
-    LocalList names;
-    status = KNF_GetInstanceListAlloc(KNF_NODE_INTR_NAMES, keys, &names.list);
-    if (status != 0) {
+    if (KnfStatus status = KNF_GetInstanceListAlloc(KNF_NODE_INTR_NAMES, keys, &names.list)) {
         LogStatus(0, status, "Unable to get names for interrupt %Ld\n", vector);
         return false;
     }
     FillSlot(names.list, slot);
-    KNF_ParamListRemoveLastParam(keys);
     return true;
 }
 

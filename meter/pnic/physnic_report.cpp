@@ -11,11 +11,18 @@ constexpr u32 KNF_NODE_PNIC_RXQ_FILTERS = 123;
 constexpr u32 KNF_NODE_PNIC_RXQ_FILTER = 126;
 constexpr u32 BUSY_QUEUE = 100;  // packets per second above which a transmit queue counts as active
 
-template <std::size_t Size>
-u64 SumOfDeltas(const u64 (&curr)[Size], const u64 (&prev)[Size]) {
-    u64 sum = 0;
-    for (std::size_t i = 0; i < Size; i++) {
-        sum += curr[i] - prev[i];
+u64 TxErrors(const PnicStats &stats) {
+    u64 sum = stats.txErrors40 + stats.txErrors56;
+    for (u32 i = 0; i < PNIC_TX_ERRORS; i++) {
+        sum += stats.txErrors128[i];
+    }
+    return sum;
+}
+
+u64 RxErrors(const PnicStats &stats) {
+    u64 sum = stats.rxErrors32 + stats.rxErrors48;
+    for (u32 i = 0; i < PNIC_RX_ERRORS; i++) {
+        sum += stats.rxErrors80[i];
     }
     return sum;
 }
@@ -26,12 +33,10 @@ void PrintLink(PhysNic *nic, f32 elapsed, ReportBuf *report) {
     const PnicStats &p = *nic->statsPrev;
     u64 txPkts = c.txPkts - p.txPkts;
     u64 txBytes = c.txBytes - p.txBytes;
-    u64 txErrors =
-        (c.txErrors40 - p.txErrors40) + (c.txErrors56 - p.txErrors56) + SumOfDeltas(c.txErrors128, p.txErrors128);
+    u64 txErrors = TxErrors(c) - TxErrors(p);
     u64 rxPkts = c.rxPkts - p.rxPkts;
     u64 rxBytes = c.rxBytes - p.rxBytes;
-    u64 rxErrors =
-        (c.rxErrors32 - p.rxErrors32) + (c.rxErrors48 - p.rxErrors48) + SumOfDeltas(c.rxErrors80, p.rxErrors80);
+    u64 rxErrors = RxErrors(c) - RxErrors(p);
     ReportPrintf(report, ",\n  \"physnic\": {\"devname\": \"%s\"", nic->name);
     ReportPrintf(report, ",\n    \"txpps\": %.0f, \"txmbps\": %.1f, \"txsize\": %u, \"txeps\": %.2f, ",
                  Rate(txPkts, elapsed), Megabits(static_cast<double>(txBytes * 8), elapsed), MeanSize(txBytes, txPkts),

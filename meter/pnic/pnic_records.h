@@ -13,6 +13,9 @@ struct __attribute__((packed)) PnicProperties {
 };
 static_assert(sizeof(PnicProperties) == 1252 && offsetof(PnicProperties, portNum) == 193);
 
+constexpr u32 PNIC_RX_ERRORS = 6;  // further error counters, in a row
+constexpr u32 PNIC_TX_ERRORS = 5;
+
 struct __attribute__((packed)) PnicStats {
     u64 rxPkts;
     u64 txPkts;
@@ -23,8 +26,8 @@ struct __attribute__((packed)) PnicStats {
     u64 rxErrors48;
     u64 txErrors56;
     u8 reserved64[16];
-    u64 rxErrors80[6];
-    u64 txErrors128[5];
+    u64 rxErrors80[PNIC_RX_ERRORS];
+    u64 txErrors128[PNIC_TX_ERRORS];
     u8 reserved168[4128];
 };
 static_assert(sizeof(PnicStats) == 4296 && offsetof(PnicStats, txErrors56) == 56 &&

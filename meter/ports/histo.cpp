@@ -7,8 +7,7 @@
 #include "meter/support/run.h"
 
 #include <cstdlib>
-#include <cstring>
-#include <iterator>
+#include <tuple>
 
 namespace {
 
@@ -23,32 +22,37 @@ constexpr u32 KNF_NODE_PORT_HISTO_INTERVAL_IN = 337;
 constexpr u32 KNF_NODE_PORT_HISTO_INTERVAL_OUT = 338;
 
 // The six records in the order of reading and reporting.
+template <u32 Limits>
 struct HistoKind {
-    PortHistogram *Port::*record;
+    PortHistogram<Limits> *Port::*record;
     u32 node;
-    u32 limits;  // buckets with a limit of their own; one more follows them
     const char *tag;
     const char *stage;
     const char *name;
 };
-constexpr HistoKind KINDS[] = {
-    {&Port::pktSizeIn, KNF_NODE_PORT_HISTO_PKT_IN, 11, "Pkt Input Histograms", "Port Pkt Input Histo", "pktsizein"},
-    {&Port::pktSizeOut, KNF_NODE_PORT_HISTO_PKT_OUT, 11, "Pkt Output Histograms", "Port Pkt Output Histo",
-     "pktsizeout"},
-    {&Port::clusterIn, KNF_NODE_PORT_HISTO_CLUSTER_IN, 14, "Cluster Input Histograms", "Port Cluster Input Histo",
-     "clusterin"},
-    {&Port::clusterOut, KNF_NODE_PORT_HISTO_CLUSTER_OUT, 14, "Cluster Output Histograms", "Port Cluster Output Histo",
-     "clusterout"},
-    {&Port::pktIntervalIn, KNF_NODE_PORT_HISTO_INTERVAL_IN, 18, "Pkt Interval Input Histograms",
-     "Port Cluster Intervals Input Histo", "pktintervalin"},
-    {&Port::pktIntervalOut, KNF_NODE_PORT_HISTO_INTERVAL_OUT, 18, "Pkt Interval Output Histograms",
-     "Port Cluster Intervals Output Histo", "pktintervalout"},
+constexpr std::tuple KINDS = {
+    HistoKind<11>{&Port::pktSizeIn, KNF_NODE_PORT_HISTO_PKT_IN, "Pkt Input Histograms", "Port Pkt Input Histo",
+                  "pktsizein"},
+    HistoKind<11>{&Port::pktSizeOut, KNF_NODE_PORT_HISTO_PKT_OUT, "Pkt Output Histograms", "Port Pkt Output Histo",
+                  "pktsizeout"},
+    HistoKind<14>{&Port::clusterIn, KNF_NODE_PORT_HISTO_CLUSTER_IN, "Cluster Input Histograms",
+                  "Port Cluster Input Histo", "clusterin"},
+    HistoKind<14>{&Port::clusterOut, KNF_NODE_PORT_HISTO_CLUSTER_OUT, "Cluster Output Histograms",
+                  "Port Cluster Output Histo", "clusterout"},
+    HistoKind<18>{&Port::pktIntervalIn, KNF_NODE_PORT_HISTO_INTERVAL_IN, "Pkt Interval Input Histograms",
+                  "Port Cluster Intervals Input Histo", "pktintervalin"},
+    HistoKind<18>{&Port::pktIntervalOut, KNF_NODE_PORT_HISTO_INTERVAL_OUT, "Pkt Interval Output Histograms",
+                  "Port Cluster Intervals Output Histo", "pktintervalout"},
 };
 
-constexpr u32 RecordSize(u32 limits) {
-    return static_cast<u32>(offsetof(PortHistogram, bucket) + (limits + 1) * sizeof(HistoBucket));
+// Visits the kinds in their order until a visit gives false.
+template <typename Visit>
+void EachKind(Visit visit) {
+    std::apply([&visit](const auto &...kind) { (void)(visit(kind) && ...); }, KINDS);
 }
-static_assert(RecordSize(11) == 224 && RecordSize(14) == 272 && RecordSize(18) == 336);
+
+// As the node takes them, and the messages name them.
+constexpr const char *OPERATIONS[] = {"start", "reset", "stop"};
 
 // The writes of one direction, in order.
 struct HistoWrite {
@@ -62,80 +66,79 @@ constexpr HistoWrite OUTPUT_WRITES[] = {{KNF_NODE_PORT_HISTO_CLUSTER_SIZES, "out
                                         {KNF_NODE_PORT_HISTO_PKT_SIZES, "output on pktSizes"},
                                         {KNF_NODE_PORT_HISTO_PKT_INTERVALS, "output on pktIntverals"}};
 
-KnfStatus Abort(Port *port, const char *op, KnfStatus status, const char *stage) {
+KnfStatus Abort(Port *port, HistoOperation op, KnfStatus status, const char *stage) {
     DropList(&port->histoParams);
-    LogStatus(0, status, "Histogram op %s failed in stage %s\n", op, stage);
+    LogStatus(0, status, "Histogram op %s failed in stage %s\n", OPERATIONS[op], stage);
     return status;
 }
 
-// Once the input side is set up, "start" and "reset" pass over failures: a histogram that does not run reads as it is.
-bool Stopping(const char *op) {
-    return std::strcmp(op, "stop") == 0;
-}
-
-KnfStatus Write(Port *port, const char *op, const HistoWrite (&writes)[3]) {
+// Once the input side is set up, start and reset pass over failures: a histogram that does not run reads as it is.
+KnfStatus Write(Port *port, HistoOperation op, const HistoWrite (&writes)[3]) {
     for (const HistoWrite &write : writes) {
         KnfStatus status = KNF_Set(write.node, port->portParams, port->histoParams, nullptr, 0);
-        if (status != 0 && Stopping(op)) {
+        if (status != 0 && op == HISTO_STOP) {
             return Abort(port, op, status, write.stage);
         }
     }
     return 0;
 }
 
-double BucketPercent(const PortHistogram &histo, u32 bucket) {
-    return Quotient(100.0 * static_cast<double>(histo.bucket[bucket].count), static_cast<double>(histo.count));
-}
-
-void PrintOne(const HistoKind &kind, PortHistogram *histo, f32 elapsed, ReportBuf *report) {
-    ReportPrintf(report, "    { \"name\": \"%s\", \"min\": %Lu, \"max\": %Lu ,\"mean\": %Lu, \"count\": %.0f",
-                 kind.name, histo->min, histo->max, histo->mean, Rate(histo->count, elapsed));
-    if (histo->count == 0) {
-        histo->count = 1;  // the divisor of the percentages; gone with the next read
+void PrintOne(const char *name, HistoTotals *totals, const HistoBucket *bucket, u32 limits, f32 elapsed,
+              ReportBuf *report) {
+    ReportPrintf(report, "    { \"name\": \"%s\", \"min\": %Lu, \"max\": %Lu ,\"mean\": %Lu, \"count\": %.0f", name,
+                 totals->min, totals->max, totals->mean, Rate(totals->count, elapsed));
+    if (totals->count == 0) {
+        totals->count = 1;  // the divisor of the percentages; gone with the next read
     }
+    auto percent = [totals, bucket](u32 i) {
+        return Quotient(100.0 * static_cast<double>(bucket[i].count), static_cast<double>(totals->count));
+    };
     ReportPrintf(report, ",\n      \"values\":[");
-    for (u32 i = 0; i < kind.limits; i++) {
-        ReportPrintf(report, "[%Ld, %.1f], ", static_cast<i64>(histo->bucket[i].limit), BucketPercent(*histo, i));
+    for (u32 i = 0; i < limits; i++) {
+        ReportPrintf(report, "[%Ld, %.1f], ", static_cast<i64>(bucket[i].limit), percent(i));
     }
-    ReportPrintf(report, "[%Ld, %.1f]] }", static_cast<i64>(histo->bucket[kind.limits - 1].limit + 1),
-                 BucketPercent(*histo, kind.limits));
+    ReportPrintf(report, "[%Ld, %.1f]] }", static_cast<i64>(bucket[limits - 1].limit + 1), percent(limits));
 }
 
 }  // namespace
 
 void HistoAlloc(Port *port) {
-    for (const HistoKind &kind : KINDS) {
-        port->*kind.record = static_cast<PortHistogram *>(AllocClearedOrPanic(1, RecordSize(kind.limits), kind.tag));
-    }
+    EachKind([port]<u32 Limits>(const HistoKind<Limits> &kind) {
+        port->*kind.record = AllocArray<PortHistogram<Limits>>(1, kind.tag);
+        return true;
+    });
     port->histoStarted = 0;
 }
 
 void HistoFree(Port *port) {
-    for (const HistoKind &kind : KINDS) {
+    EachKind([port](const auto &kind) {
         std::free(port->*kind.record);
-    }
+        return true;
+    });
 }
 
-// A record's size goes by its kind, so these reads name it themselves.
 KnfStatus HistoRead(Port *port, bool first, const char **stage) {
-    for (std::size_t i = 0; !first && i < std::size(KINDS); i++) {
-        const HistoKind &kind = KINDS[i];
-        if (KnfStatus status = KNF_Get(kind.node, port->portParams, port->*kind.record, RecordSize(kind.limits))) {
+    KnfStatus status = 0;
+    EachKind([&](const auto &kind) {
+        if (!first) {
             *stage = kind.stage;
-            return status;
+            status = NodeGet(kind.node, port->portParams, port->*kind.record);
         }
+        return status == 0;
+    });
+    if (status == 0) {
+        HistoOp(port->histoStarted != 0 ? HISTO_RESET : HISTO_START, port);
+        port->histoStarted = 1;
     }
-    HistoOp(port->histoStarted != 0 ? "reset" : "start", port);
-    port->histoStarted = 1;
-    return 0;
+    return status;
 }
 
-KnfStatus HistoOp(const char *op, Port *port) {
+KnfStatus HistoOp(HistoOperation op, Port *port) {
     if (cacheEnabled != 0 || (*port->prefs & PREF_HISTO) == 0 || port->histoParams == nullptr) {
         return 0;
     }
-    if (KnfStatus status = KNF_ParamListAddString(port->histoParams, op)) {
-        return Abort(port, op, status, op);
+    if (KnfStatus status = KNF_ParamListAddString(port->histoParams, OPERATIONS[op])) {
+        return Abort(port, op, status, OPERATIONS[op]);
     }
     if (KnfStatus status = KNF_ParamListAddString(port->histoParams, "input")) {
         return Abort(port, op, status, "adding input histo");
@@ -145,7 +148,7 @@ KnfStatus HistoOp(const char *op, Port *port) {
     }
     KNF_ParamListRemoveLastParam(port->histoParams);
     KnfStatus added = KNF_ParamListAddString(port->histoParams, "output");
-    if (added != 0 && Stopping(op)) {
+    if (added != 0 && op == HISTO_STOP) {
         return Abort(port, op, added, "adding output histo");
     }
     if (KnfStatus status = Write(port, op, OUTPUT_WRITES)) {
@@ -158,19 +161,23 @@ KnfStatus HistoOp(const char *op, Port *port) {
 
 void HistoPrint(Port *port, ReportBuf *report) {
     ReportPrintf(report, ",\n  \"histos\":[\n");
-    for (const HistoKind &kind : KINDS) {
-        PrintOne(kind, port->*kind.record, port->elapsed, report);
-        if (&kind != std::end(KINDS) - 1) {
+    bool behind = false;
+    EachKind([&]<u32 Limits>(const HistoKind<Limits> &kind) {
+        PortHistogram<Limits> *histo = port->*kind.record;
+        if (behind) {
             ReportPrintf(report, ",\n");
         }
-    }
+        PrintOne(kind.name, &histo->totals, histo->bucket, Limits, port->elapsed, report);
+        behind = true;
+        return true;
+    });
     ReportPrintf(report, " ]");
 }
 
 KnfStatus PortSetPrefs(Port *port, const PortPrefs *prefs) {
     bool hadHistos = (*port->prefs & PREF_HISTO) != 0 && port->pktSizeIn != nullptr;
     if (hadHistos && (*prefs & PREF_HISTO) == 0) {
-        HistoOp("stop", port);
+        HistoOp(HISTO_STOP, port);
         port->histoStarted = 0;
     }
     if ((*prefs & PREF_VCPU_HISTO) == 0 && port->numVcpus != 0) {

@@ -11,15 +11,21 @@ struct __attribute__((packed)) HistoBucket {
     u64 limit;  // upper; the last bucket of a histogram has none, and its field is not read
 };
 
-// A kind of histogram may have fewer buckets than this: the kernel's record, and the memory of it, end behind its last.
-struct __attribute__((packed)) PortHistogram {
+struct __attribute__((packed)) HistoTotals {
     u64 min;
     u64 max;
     u64 mean;
     u64 count;  // samples, over which the buckets are percentages
-    HistoBucket bucket[19];
 };
-static_assert(sizeof(PortHistogram) == 336 && offsetof(PortHistogram, bucket) == 32);
+
+// One bucket more than limits: the last holds what lies above them all.
+template <u32 Limits>
+struct __attribute__((packed)) PortHistogram {
+    HistoTotals totals;
+    HistoBucket bucket[Limits + 1];
+};
+static_assert(sizeof(PortHistogram<11>) == 224 && sizeof(PortHistogram<14>) == 272 && sizeof(PortHistogram<18>) == 336);
+static_assert(offsetof(PortHistogram<11>, bucket) == 32);
 
 // Gives a new port its six records.
 void HistoAlloc(Port *port);
@@ -30,9 +36,11 @@ void HistoFree(Port *port);
 // read, with the text for its message in *stage.
 KnfStatus HistoRead(Port *port, bool first, const char **stage);
 
-// Writes one operation, "start", "reset" or "stop", to all histograms of the port. Only a "stop" that fails, or a
-// failure ahead of the first write, ends the port's histograms: logged, its argument list destroyed.
-KnfStatus HistoOp(const char *op, Port *port);
+enum HistoOperation : u8 { HISTO_START, HISTO_RESET, HISTO_STOP };
+
+// Writes one operation to all histograms of the port. Only a stop that fails, or a failure ahead of the first write,
+// ends the port's histograms: logged, its argument list destroyed.
+KnfStatus HistoOp(HistoOperation op, Port *port);
 
 // The "histos" section.
 void HistoPrint(Port *port, ReportBuf *report);

@@ -12,6 +12,7 @@
 
 struct HostNicStats;
 struct PhysNic;
+template <u32 Limits>
 struct PortHistogram;
 struct Vcpu;
 struct Vnic;
@@ -89,13 +90,13 @@ struct Port {
     PortClientStats *prevStats;
     timeval prevTime;  // when prevStats was filled
     timeval curTime;
-    u8 histoStarted;           // the kernel was asked to start the port's histograms
-    PortHistogram *pktSizeIn;  // the six histogram records, null unless the prefs ask for them
-    PortHistogram *pktSizeOut;
-    PortHistogram *clusterIn;
-    PortHistogram *clusterOut;
-    PortHistogram *pktIntervalIn;
-    PortHistogram *pktIntervalOut;
+    u8 histoStarted;               // the kernel was asked to start the port's histograms
+    PortHistogram<11> *pktSizeIn;  // the six histogram records, null unless the prefs ask for them
+    PortHistogram<11> *pktSizeOut;
+    PortHistogram<14> *clusterIn;
+    PortHistogram<14> *clusterOut;
+    PortHistogram<18> *pktIntervalIn;
+    PortHistogram<18> *pktIntervalOut;
     Wdt *wdt;  // the companions, null if absent; at most one of the NIC companions is set
     Vnic *vnic;
     PhysNic *physnic;

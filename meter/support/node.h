@@ -8,13 +8,15 @@
 #include <type_traits>
 
 // Reads one instance into its record, whose type fixes the size. Texts of a record end at the latest with the last
-// byte of their span: a record with texts says so in a member EndTexts, which runs behind each read.
+// byte of their span: a record with texts says so in a member EndTexts, which runs behind each good read.
 template <typename Record>
 KnfStatus NodeGet(u32 node, KnfParamList instance, Record *record) {
     static_assert(std::is_trivially_copyable_v<Record>);
     KnfStatus status = KNF_Get(node, instance, record, sizeof(Record));
     if constexpr (requires { record->EndTexts(); }) {
-        record->EndTexts();
+        if (status == 0) {
+            record->EndTexts();
+        }
     }
     return status;
 }
@@ -25,13 +27,16 @@ void EndText(char (&span)[Size]) {
     span[Size - 1] = '\0';
 }
 
-// A key in a list for the life of the guard. A key that could not be added is not removed.
+// A key in a list for the life of the guard. A key that could not be added is not removed. A list that could not be
+// made takes none.
 struct VaryingKey {
     KnfParamList list;
     KnfStatus status;  // of the addition
 
-    VaryingKey(KnfParamList keys, i64 value) : list(keys), status(KNF_ParamListAddInt(keys, value)) {}
-    VaryingKey(KnfParamList keys, const char *text) : list(keys), status(KNF_ParamListAddString(keys, text)) {}
+    VaryingKey(KnfParamList keys, i64 value)
+        : list(keys), status(keys != nullptr ? KNF_ParamListAddInt(keys, value) : KNF_FAILURE) {}
+    VaryingKey(KnfParamList keys, const char *text)
+        : list(keys), status(keys != nullptr ? KNF_ParamListAddString(keys, text) : KNF_FAILURE) {}
     VaryingKey(const VaryingKey &) = delete;
     VaryingKey &operator=(const VaryingKey &) = delete;
     ~VaryingKey() {

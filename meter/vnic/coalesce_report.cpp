@@ -24,13 +24,33 @@ CoalesceDetails Scheme1Details(const Vnic *vnic) {
     const VnicCoalesceTx &tx = vnic->coalesceTx;
     const VnicCoalesceTxComp &txComp = vnic->coalesceTxComp;
     const VnicCoalesceRx &rx = vnic->coalesceRx;
-    return {tx.dyn,     tx.depth,     tx.splitCall, tx.splitOppor, tx.splitTo, tx.splitHc,
-            txComp.dyn, txComp.depth, rx.dyn,       rx.depth,      rx.intrReq, rx.intrPost};
+    return {.txDyn = tx.dyn,
+            .txDepth = tx.depth,
+            .splitCall = tx.splitCall,
+            .splitOppor = tx.splitOppor,
+            .splitTo = tx.splitTo,
+            .splitHc = tx.splitHc,
+            .txCompDyn = txComp.dyn,
+            .txCompDepth = txComp.depth,
+            .rxDyn = rx.dyn,
+            .rxDepth = rx.depth,
+            .intrReq = rx.intrReq,
+            .intrPost = rx.intrPost};
 }
 
 CoalesceDetails Scheme2Details(const VnicCoalesceScheme2 &all) {
-    return {all.txDyn,     all.txDepth,     all.splitCall, all.splitOppor, all.splitTo, all.splitHc,
-            all.txCompDyn, all.txCompDepth, all.rxDyn,     all.rxDepth,    all.intrReq, all.intrPost};
+    return {.txDyn = all.txDyn,
+            .txDepth = all.txDepth,
+            .splitCall = all.splitCall,
+            .splitOppor = all.splitOppor,
+            .splitTo = all.splitTo,
+            .splitHc = all.splitHc,
+            .txCompDyn = all.txCompDyn,
+            .txCompDepth = all.txCompDepth,
+            .rxDyn = all.rxDyn,
+            .rxDepth = all.rxDepth,
+            .intrReq = all.intrReq,
+            .intrPost = all.intrPost};
 }
 
 // The 1 keeps the whole from being 0, unless the sum wraps.
