@@ -108,10 +108,38 @@ TEST(Driver, FullDiskIsToldAndEndsTheRunOnceTextIsLost) {
     MeterRun once = RunMeter(HOST, "-p 7 -i 1 -o /dev/full");
     EXPECT_EQ(once.status, 0);
     EXPECT_EQ(Count(once.err, "Error No space left on device\n"), 2U) << "end of the iteration, end of the document";
-    MeterRun longer = RunMeter(HOST, "-p 7 -i 1 -n 0 -o /dev/full");
+    MeterRun longer = RunMeter(HOST, "-p 7 -i 1 -n 0 -o /dev/full", {"COREKIT_TRACE= COREKIT_JOURNAL="});
     EXPECT_EQ(longer.status, 1);
-    EXPECT_EQ(Count(longer.err, "\n"), Count(longer.err, "Error No space left on device\n"));
+    EXPECT_EQ(Count(longer.err, "\n"), Count(longer.err, "Unable to write to fd 3. Error No space left on device\n"))
+        << "the report's is the first descriptor that is free";
     EXPECT_EQ(RunMeter(HOST, "-p 7 -i 1 -n 50 >&-").status, 1) << "standard output closed at start";
+    MeterRun nothing = RunMeter("host\nswitch s\n", "-l >&-");
+    EXPECT_EQ(nothing.err, "") << "an empty listing is not written";
+    EXPECT_EQ(nothing.status, 0);
+}
+
+TEST(Driver, ClosedStandardErrorTakesNoReport) {
+    RunMeter(HOST, "-d 2 -p 7 -i 1 -o report 2>&-", {"COREKIT_TRACE= COREKIT_JOURNAL="});
+    EXPECT_EQ(RunFile("report"), RunMeter(HOST, "-p 7 -i 1").out);
+}
+
+// As a disk that fills up, but that the system's default is to kill the process.
+TEST(Driver, LimitOfFileSizeEndsALiveRunWithTracking) {
+    MeterRun run = RunScript("", "head -c 24576 /dev/zero >out; ulimit -f 48; $METER -A -t hV -i 1 -n 2 >>out 2>err",
+                             {"COREKIT_TRACE="});
+    EXPECT_EQ(run.status, 1);
+    EXPECT_EQ(run.err, "Unable to write to fd 1. Error File too large\n");
+    EXPECT_TRUE(run.journal.ends_with("set 520 \"Cpu\" \"TrackHistos\" : 0 -> 0x0\n")) << run.journal;
+    EXPECT_EQ(Count(run.journal, "\"start\""), Count(run.journal, "\"stop\""));
+}
+
+TEST(Driver, TextsAndMessagesOfAnyLengthAreWhole) {
+    std::string name = "NetWdt-Async-9-" + std::string(9000, 'n');
+    MeterRun run = RunMeter("host\nswitch s\nvm v leader=9\nvnic switch=s port=7 vm=v model=3\nworldlet " + name + "\n",
+                            "-d 1 -p 7 -t W -i 1");
+    EXPECT_EQ(Count(run.err, "Log1: Added " + name + " wdt for NetWdt-Async-9 mask\n"), 1U);
+    EXPECT_EQ(Count(run.err, "No Space in buffer. Resize output buffer from 4096 bytes\n\"afftype\": "), 1U);
+    EXPECT_TRUE(run.err.ends_with(", \"name\": \"" + name + "\"}")) << run.err.size();
 }
 
 TEST(Driver, ReaderThatGoesAwayEndsAnEndlessRun) {
@@ -142,17 +170,48 @@ TEST(Driver, SignalDuringTheSleepEndsItAtOnceWithAnEmptyOutput) {
     EXPECT_FALSE(ignored.Document().is_discarded());
 }
 
-// Each run waits for somebody at the other end of a pipe, who does nothing.
+// Each run waits for somebody at the other end of a pipe, who does nothing, or reads what never ends.
 TEST(Driver, SignalEndsEveryWaitForAnotherProgram) {
     for (const char *command :
          {"sleep 1 <fifo & $METER -p 7 -i 0 -n 0 >fifo 2>err", "sleep 1 <fifo & $METER -d 1 -A -i 0 -n 0 2>fifo >out",
           "$METER -p 7 -o fifo >out 2>err", "$METER -C fifo >out 2>err",
-          "{ printf '7 q'; sleep 1; } >fifo & $METER -C fifo >out 2>err"}) {
+          "{ printf '7 q'; sleep 1; } >fifo & $METER -C fifo >out 2>err", "yes '' >fifo & $METER -C fifo >out 2>err",
+          "{ printf '# '; cat /dev/zero; } >fifo & $METER -C fifo >out 2>err"}) {
         MeterRun run = Signalled(std::string("rm -f fifo; mkfifo fifo; ") + command, "TERM");
         EXPECT_EQ(RunFile("status"), "1\n") << command;
         EXPECT_LT(std::stoi(RunFile("ms")), 500) << command;
         EXPECT_EQ(run.err, "") << command;
     }
+}
+
+// The panic's message waits for a terminal that nobody reads while tracking is on.
+TEST(Driver, SignalEndsEvenAPanicWithTrackingOff) {
+    WriteRunFile("ports", "83886083 V\nnone\n");
+    MeterRun run = RunScript("", R"(python3 - $METER -C ports <<'END'
+import os, pty, signal, subprocess, sys, time
+mine, its = pty.openpty()
+os.set_blocking(its, False)
+try:
+    while os.write(its, b"x" * 512):
+        pass
+except BlockingIOError:
+    os.set_blocking(its, True)
+run = subprocess.Popen(sys.argv[1:], stderr=its)
+time.sleep(0.5)
+assert run.poll() is None
+run.terminate()
+print(run.wait(5), file=open("status", "w"))
+END)",
+                             {"", true});
+    EXPECT_EQ(RunFile("status"), "1\n");
+    EXPECT_EQ(run.journal, "set 520 \"Cpu\" \"TrackHistos\" : 1 -> 0x0\nset 520 \"Cpu\" \"TrackHistos\" : 0 -> 0x0\n");
+}
+
+TEST(Driver, SignalAmidAPortWritesNoFurtherText) {
+    std::string host = "host\nswitch s\nuplink switch=s port=7 nic=n rxqueues=1000 filters=1\n";
+    MeterRun run = RunMeter(host + "fault list 123 \"n\" 1 signal=15\n", "-p 7 -t vq -i 1");
+    EXPECT_EQ(run.status, 1);
+    EXPECT_EQ(run.out, "");
 }
 
 }  // namespace

@@ -36,6 +36,8 @@ struct PipeReport {
     }
 };
 
+const char *statusText = nullptr;  // in place of the library's
+
 std::string StderrOf(const auto &action) {
     testing::internal::CaptureStderr();
     action();
@@ -123,6 +125,10 @@ TEST(Log, LevelsFilterAllButPanic) {
     EXPECT_EQ(StderrOf(say), "Log0: a1\nLog1: b\nLog2 Status: " + status + ". Message: c\n");
     logLevel = -1;
     EXPECT_EQ(StderrOf(say), "");
+    logLevel = 0;
+    std::string text(5000, 't');
+    statusText = text.c_str();
+    EXPECT_EQ(StderrOf([] { LogStatus(0, KNF_FAILURE, "m\n"); }), "Log0 Status: " + text + ". Message: m\n");
     EXPECT_EXIT(Panic("gone %s", "wrong"), testing::ExitedWithCode(1), "^Panic: gone wrong$");
 }
 
@@ -164,3 +170,8 @@ TEST(Number, RulesHoldAtTheEdgesOfTheirWidths) {
 }
 
 }  // namespace
+
+// Ahead of the library's.
+extern "C" const char *HCK_ReturnStatusToString(KnfStatus /*status*/) {
+    return statusText != nullptr ? statusText : "a status";
+}

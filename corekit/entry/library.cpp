@@ -32,6 +32,8 @@ struct Library {
     uint64_t calls[CALL_KINDS] = {};
 };
 
+constexpr int SCRIBBLE = 0xa5;  // what a refused read leaves in the record: nobody may use it
+
 // Never destroyed: calls may still come while the process ends.
 Library &Lib() {
     static auto *library = new Library;
@@ -160,6 +162,8 @@ KnfStatus KNF_Get(uint32_t node, KnfParamList instance, void *record, uint32_t s
         if (status == STATUS_OK) {
             const NodeSource *source = Lib().current;
             status = record == nullptr ? STATUS_BAD_PARAM : source->get(source->context, node, keys, record, size);
+        } else if (record != nullptr) {
+            memset(record, SCRIBBLE, size);
         }
         return Told(status, "get", &node, keys);
     });

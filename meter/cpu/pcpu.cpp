@@ -178,7 +178,7 @@ KnfStatus SchedStatsPcpuStats(bool first) {
             LogDirect("SchedStatsPcpuStats: KNF_ParamListAddInt()\n");
             return pcpu.status;
         }
-        if (KnfStatus status = NodeGet(KNF_NODE_PCPU_STATS, instanceParams, &stats[i])) {
+        if (KnfStatus status = NodeUpdate(KNF_NODE_PCPU_STATS, instanceParams, &stats[i])) {
             LogMsg(0, "Unable to read pcpu %d stats: %s", static_cast<i32>(i), HCK_ReturnStatusToString(status));
             return status;
         }

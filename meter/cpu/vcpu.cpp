@@ -99,7 +99,7 @@ KnfStatus ReadOne(Vcpu *vcpu, KnfParamList args, bool first, bool *histoFailed) 
         return id.status;
     }
     if (KnfStatus status =
-            NodeGet(KNF_NODE_VCPU_STATE_TIMES, args, first ? &vcpu->prevStateTimes : &vcpu->curStateTimes)) {
+            NodeUpdate(KNF_NODE_VCPU_STATE_TIMES, args, first ? &vcpu->prevStateTimes : &vcpu->curStateTimes)) {
         LogStatus(0, status, "vcpuid %Lu: Unable to read stateTimes\n", vcpu->id);
         return status;
     }

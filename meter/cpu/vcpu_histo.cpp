@@ -5,6 +5,7 @@
 #include "meter/support/node.h"
 #include "meter/support/number.h"
 #include "meter/support/run.h"
+#include "meter/support/termination.h"
 
 #include <array>
 #include <cstdlib>
@@ -136,7 +137,10 @@ KnfStatus VcpuHistoTrack(i32 state) {
         return DisableForever(status);
     }
     u32 result = 0;
-    status = KNF_Set(KNF_NODE_CONFIG_OPTION_SET, trackHistoPath, trackHistoValue, &result, sizeof result);
+    {
+        UncutCalls uncut;
+        status = KNF_Set(KNF_NODE_CONFIG_OPTION_SET, trackHistoPath, trackHistoValue, &result, sizeof result);
+    }
     if (status != 0) {
         LogStatus(0, status, "Unable to change vcpu histo stateto %d. Disabling forever.", state);
         return DisableForever(status);

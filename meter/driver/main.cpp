@@ -4,12 +4,12 @@
 #include "meter/driver/options.h"
 #include "meter/driver/sampling.h"
 #include "meter/driver/selection.h"
-#include "meter/driver/signals.h"
 #include "meter/driver/source.h"
 #include "meter/driver/watched.h"
 #include "meter/ports/enumerate.h"
 #include "meter/support/log.h"
 #include "meter/support/run.h"
+#include "meter/support/termination.h"
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -34,7 +34,7 @@ void ReserveStandardDescriptors() {
 void OpenSource(Settings *settings) {
     if (cacheEnabled == 0) {
         HckSyscall_Init(1, 0, 0);
-        InstallSignalHandlers();
+        InstallTerminationHandlers(Teardown);
         return;
     }
     CacheStep(&settings->cacheSpec, settings->checkVersion);
@@ -59,9 +59,10 @@ int main(int argc, char **argv) {
     if (!CheckVersion() && settings.checkVersion) {
         return 1;
     }
-    if (settings.outfile != nullptr && Interruptibly([&] { return OpenReportFile(settings.outfile, &report); }) < 0) {
+    if (settings.outfile != nullptr && OpenReportFile(settings.outfile, &report) < 0) {
         return 1;
     }
+    LeaveIfTerminated();
     if (settings.listPorts) {
         ListPorts(&report);
         ReportFlush(&report);

@@ -2,10 +2,10 @@
 
 #include "meter/cpu/pcpu.h"
 #include "meter/cpu/self.h"
-#include "meter/driver/signals.h"
 #include "meter/driver/source.h"
 #include "meter/driver/watched.h"
 #include "meter/support/run.h"
+#include "meter/support/termination.h"
 
 #include <unistd.h>
 

@@ -1,13 +1,13 @@
 #include "meter/driver/selection.h"
 
+#include "meter/driver/config_file.h"
 #include "meter/driver/watched.h"
 #include "meter/pnic/physnic.h"
 #include "meter/ports/enumerate.h"
 #include "meter/support/log.h"
 #include "meter/support/run.h"
+#include "meter/support/termination.h"
 
-#include <cerrno>
-#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 
@@ -98,13 +98,14 @@ void AddVmPorts(const char *vmname) {
 
 // One entry of the configuration file, its first word read already. The bits of a switch entry are dropped: its ports
 // get the defaults of their kinds.
-void AddEntry(std::FILE *file, const char *word, PortPrefs cmdPrefs) {
+void AddEntry(ConfigFile *file, const char *word, PortPrefs cmdPrefs) {
     i64 number = std::strtoll(word, nullptr, 10);
     PortPrefs entryPrefs = cmdPrefs;
-    char spec[128 + 1];
-    if (Interruptibly([&] { return std::fscanf(file, "%128[^\n]", spec); }) == 1) {
+    char spec[CONFIG_TEXT];
+    if (ConfigReadRest(file, spec)) {
         ParseStatsSpec(spec, &entryPrefs);
     }
+    LeaveIfTerminated();
     if (number != 0) {
         AppendPort(static_cast<u64>(number), &entryPrefs);
     } else {
@@ -112,33 +113,28 @@ void AddEntry(std::FILE *file, const char *word, PortPrefs cmdPrefs) {
     }
 }
 
-void SkipLine(std::FILE *file) {
-    Interruptibly([file] {
-        int letter = 0;
-        do {
-            letter = std::getc(file);
-        } while (letter != '\n' && letter != EOF);
-        return letter;
-    });
-}
-
 // A read error ends the file as its end does.
 void AddConfiguredPorts(const char *cfgFile, PortPrefs cmdPrefs) {
-    std::FILE *file = Interruptibly([cfgFile] { return fopen64(cfgFile, "r"); });
-    if (file == nullptr) {
-        Panic("Unable to open config file. Error:%s\n", std::strerror(errno));
+    ConfigFile file;
+    int error = ConfigOpen(cfgFile, &file);
+    LeaveIfTerminated();
+    if (error != 0) {
+        Panic("Unable to open config file. Error:%s\n", std::strerror(error));
     }
     numPorts = 0;
-    for (i32 line = 1; std::feof(file) == 0 && std::ferror(file) == 0; line++) {
-        char word[128 + 1];
-        if (Interruptibly([&] { return std::fscanf(file, "%128s", word); }) != 1) {
+    for (i32 line = 1; !ConfigEnded(file); line++) {
+        char word[CONFIG_TEXT];
+        bool found = ConfigReadWord(&file, word);
+        LeaveIfTerminated();
+        if (!found) {
             LogMsg(2, "Bad switch in %d line in %s file\n", line, cfgFile);
         } else if (word[0] != '#') {
-            AddEntry(file, word, cmdPrefs);
+            AddEntry(&file, word, cmdPrefs);
         }
-        SkipLine(file);
+        ConfigSkipLine(&file);
+        LeaveIfTerminated();
     }
-    std::fclose(file);
+    ConfigClose(&file);
 }
 
 // The bits that a letter adds; 0 for a bad one.

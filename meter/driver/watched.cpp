@@ -3,7 +3,7 @@
 #include "meter/cpu/vcpu_histo.h"
 #include "meter/ports/histo.h"
 #include "meter/support/log.h"
-#include "meter/support/run.h"
+#include "meter/support/termination.h"
 
 #include <cstdlib>
 
@@ -44,11 +44,4 @@ i32 Teardown() {
     }
     VcpuHistoTrack(0);
     return 0;
-}
-
-void LeaveIfTerminated() {
-    if (terminateRequested != 0) {
-        Teardown();
-        std::exit(1);
-    }
 }

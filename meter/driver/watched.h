@@ -2,7 +2,6 @@
 // is switched off here.
 #pragma once
 
-#include "meter/driver/signals.h"
 #include "meter/ports/port.h"
 
 extern Port **port;  // numPorts live entries of maxPorts
@@ -15,18 +14,3 @@ void AppendPort(u64 portNum, const PortPrefs *prefs);
 
 // Switches off all that the run's ports started in the kernel. Frees nothing. Always 0.
 i32 Teardown();
-
-// After a termination signal: Teardown, then exit(1), without flush and closing text.
-void LeaveIfTerminated();
-
-// An open or a read that may wait for long, on a terminal or a pipe that the user named: a termination signal ends it,
-// and the run.
-template <typename Call>
-auto Interruptibly(Call call) {
-    auto result = [&call] {
-        InterruptibleCalls interruptible;
-        return call();
-    }();
-    LeaveIfTerminated();
-    return result;
-}

@@ -3,7 +3,7 @@
 #include "meter/ports/port.h"
 #include "meter/support/log.h"
 #include "meter/support/node.h"
-#include "meter/support/run.h"
+#include "meter/support/termination.h"
 
 namespace {
 

@@ -5,6 +5,7 @@
 #include "meter/support/log.h"
 #include "meter/support/number.h"
 #include "meter/support/run.h"
+#include "meter/support/termination.h"
 
 #include <cstdlib>
 #include <tuple>
@@ -75,6 +76,7 @@ KnfStatus Abort(Port *port, HistoOperation op, KnfStatus status, const char *sta
 // Once the input side is set up, start and reset pass over failures: a histogram that does not run reads as it is.
 KnfStatus Write(Port *port, HistoOperation op, const HistoWrite (&writes)[3]) {
     for (const HistoWrite &write : writes) {
+        UncutCalls uncut;
         KnfStatus status = KNF_Set(write.node, port->portParams, port->histoParams, nullptr, 0);
         if (status != 0 && op == HISTO_STOP) {
             return Abort(port, op, status, write.stage);

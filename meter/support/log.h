@@ -1,6 +1,6 @@
 // Diagnostics on standard error, one write a message. A message brings its own line end. Levels: 0 for errors, shown by
 // default; 1 for expected refusals, tolerated failures and progress; 2 for dropped input. What is filtered out costs no
-// formatting. After a termination signal a message that its reader does not take at once is dropped.
+// formatting. A termination signal ends the wait for a reader, and what it did not take is dropped.
 #pragma once
 
 #include "interface/corekit.h"
@@ -19,5 +19,6 @@ void LogStatus(i32 level, KnfStatus status, const char *format, ...) __attribute
 void LogDirect(const char *format, ...) __attribute__((format(printf, 1, 2)));
 void LogDirectV(const char *format, va_list arguments) __attribute__((format(printf, 1, 0)));
 
-// A message that no level hides, then exit(1). Neither flushes the report nor switches anything off in the kernel.
+// A message that no level hides, then exit(1). Neither flushes the report nor switches anything off in the kernel, but
+// behind a termination signal.
 [[noreturn]] void Panic(const char *format, ...) __attribute__((format(printf, 1, 2)));

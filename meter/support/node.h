@@ -21,6 +21,18 @@ KnfStatus NodeGet(u32 node, KnfParamList instance, Record *record) {
     return status;
 }
 
+// The same for a record that is read again and again and outlives a failure: it changes only with a good read, whatever
+// a failed one left behind.
+template <typename Record>
+KnfStatus NodeUpdate(u32 node, KnfParamList instance, Record *record) {
+    Record fresh;
+    KnfStatus status = NodeGet(node, instance, &fresh);
+    if (status == 0) {
+        *record = fresh;
+    }
+    return status;
+}
+
 // Ends the text in a span of a record by its last byte, whatever that held.
 template <std::size_t Size>
 void EndText(char (&span)[Size]) {

@@ -1,23 +1,18 @@
 #include "meter/support/output.h"
 
-#include "meter/support/run.h"
+#include "meter/support/termination.h"
 
 #include <cerrno>
 #include <poll.h>
+#include <unistd.h>
 
-bool OutputReady(int fd) {
-    constexpr int SLICE = 50;  // milliseconds
-    pollfd entry = {fd, POLLOUT, 0};
-    int ready = cacheEnabled != 0 ? 1 : 0;
-    while (ready == 0) {
-        bool terminated = terminateRequested != 0;
-        ready = poll(&entry, 1, terminated ? 0 : SLICE);
-        if (terminated) {
+ssize_t WriteOutput(int fd, const char *text, std::size_t size) {
+    ssize_t written = 0;
+    while ((written = write(fd, text, size)) < 0 && errno == EAGAIN) {
+        pollfd entry = {fd, POLLOUT, 0};
+        if (poll(&entry, 1, -1) < 0) {
             break;
         }
-        if (ready < 0) {
-            ready = errno == EINTR ? 0 : 1;
-        }
     }
-    return ready > 0;
+    return written;
 }

@@ -1,8 +1,9 @@
-// Descriptors that somebody else reads: standard error and the report's.
+// Writes to descriptors that somebody else reads: standard error and the report's.
 #pragma once
 
-// Waits until a write to the descriptor would go through, and gives true; false when a termination signal came and it
-// would not. A signal between a look at the flag and a write that blocks could not end that write, so the waiting is
-// done here, in slices, and writes follow only where there is room. True at once in replay, where signals have their
-// default action and the write may just as well wait by itself.
-bool OutputReady(int fd);
+#include <cstddef>
+#include <sys/types.h>
+
+// write(2), which blocks until there is room also on a descriptor that says EAGAIN instead. A termination signal ends
+// the wait: -1 with EINTR.
+ssize_t WriteOutput(int fd, const char *text, std::size_t size);

@@ -2,13 +2,12 @@
 
 #include "meter/support/log.h"
 #include "meter/support/output.h"
-#include "meter/support/run.h"
+#include "meter/support/termination.h"
 
 #include <cerrno>
 #include <cstdarg>
 #include <cstring>
 #include <fcntl.h>
-#include <unistd.h>
 
 namespace {
 
@@ -52,12 +51,12 @@ KnfStatus ReportFlush(ReportBuf *report) {
     if (report == nullptr || report->buffer == nullptr || report->fill < 1) {
         return 0;
     }
-    if (report->gaveUp || !OutputReady(report->outFd) || terminateRequested != 0) {
+    if (report->gaveUp || terminateRequested != 0) {
         return KNF_FAILURE;
     }
     auto size = static_cast<std::size_t>(report->fill - report->sent);
     errno = 0;
-    ssize_t written = write(report->outFd, report->buffer + report->sent, size);
+    ssize_t written = WriteOutput(report->outFd, report->buffer + report->sent, size);
     if (written == static_cast<ssize_t>(size)) {
         report->fill = 0;
         report->sent = 0;

@@ -26,7 +26,7 @@ constexpr u32 PARLAN3 = 9;
 // A read that the port can do without: its failure clears the bit that asked for it.
 template <typename Record>
 void ReadTolerated(Port *port, u32 node, PortPrefs bit, Record *record) {
-    if (KnfStatus status = NodeGet(node, port->portParams, record)) {
+    if (KnfStatus status = NodeUpdate(node, port->portParams, record)) {
         LogStatus(1, status, "%s", "");
         *port->prefs &= ~bit;
     }
