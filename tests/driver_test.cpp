@@ -108,7 +108,7 @@ TEST(Driver, FullDiskIsToldAndEndsTheRunOnceTextIsLost) {
     MeterRun once = RunMeter(HOST, "-p 7 -i 1 -o /dev/full");
     EXPECT_EQ(once.status, 0);
     EXPECT_EQ(Count(once.err, "Error No space left on device\n"), 2U) << "end of the iteration, end of the document";
-    MeterRun longer = RunMeter(HOST, "-p 7 -i 1 -n 0 -o /dev/full", {"COREKIT_TRACE= COREKIT_JOURNAL="});
+    MeterRun longer = RunMeter(HOST, "-p 7 -i 1 -n 0 -o /dev/full 3>&-", {"COREKIT_TRACE= COREKIT_JOURNAL="});
     EXPECT_EQ(longer.status, 1);
     EXPECT_EQ(Count(longer.err, "\n"), Count(longer.err, "Unable to write to fd 3. Error No space left on device\n"))
         << "the report's is the first descriptor that is free";
