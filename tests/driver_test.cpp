@@ -197,8 +197,9 @@ try:
 except BlockingIOError:
     os.set_blocking(its, True)
 run = subprocess.Popen(sys.argv[1:], stderr=its)
-time.sleep(0.5)
-assert run.poll() is None
+while not os.path.exists("journal"):
+    time.sleep(0.1)
+time.sleep(0.2)
 run.terminate()
 print(run.wait(5), file=open("status", "w"))
 END)",
