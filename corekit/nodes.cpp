@@ -1,14 +1,16 @@
 #include "corekit/nodes.h"
 
+#include <array>
+
 namespace {
 
-constexpr u32 HistogramSize(u32 limits) {
-    return histogram::BucketCount(limits + 1).offset;
+constexpr u16 HistogramSize(u32 limits) {
+    return static_cast<u16>(histogram::BucketCount(limits + 1).offset);
 }
 
 struct RecordSize {
     u32 node;
-    u32 size;
+    u16 size;
 };
 // clang-format off
 constexpr RecordSize SIZES[] = {
@@ -26,13 +28,17 @@ constexpr RecordSize SIZES[] = {
 };
 // clang-format on
 
+// By number, as each read asks.
+constexpr auto SIZE_OF = [] {
+    std::array<u16, NODE_WORLDLET_STATS + 1> sizes = {};
+    for (const RecordSize &record : SIZES) {
+        sizes[record.node] = record.size;
+    }
+    return sizes;
+}();
+
 }  // namespace
 
 u32 NodeRecordSize(u32 node) {
-    for (const RecordSize &record : SIZES) {
-        if (record.node == node) {
-            return record.size;
-        }
-    }
-    return 0;
+    return node < SIZE_OF.size() ? SIZE_OF[node] : 0;
 }
