@@ -14,6 +14,7 @@
 
 #include <algorithm>
 #include <cstdlib>
+#include <cstring>
 #include <utility>
 
 PortPrefs physnicPrefs = PREF_QUEUE | PREF_INTR | PREF_VNIC | PREF_WDT;
@@ -49,9 +50,9 @@ bool IsManagement(u32 type) {
 }
 
 // The keys of all per-port nodes.
-KnfStatus AddPortKeys(KnfParamList list, const PortInfo *info) {
-    KnfStatus status = KNF_ParamListAddString(list, info->type.switchName);
-    return status != 0 ? status : KNF_ParamListAddInt(list, static_cast<i64>(info->portNum));
+KnfStatus AddPortKeys(KnfParamList list, const PortIdentity &info) {
+    KnfStatus status = KNF_ParamListAddString(list, info.switchName);
+    return status != 0 ? status : KNF_ParamListAddInt(list, static_cast<i64>(info.portNum));
 }
 
 // Reads both records. On a failure of the library `*stage` says where; a refused port leaves it null.
@@ -81,6 +82,29 @@ KnfStatus ReadInfo(PortInfo *info, const char **stage) {
     return failedAt(NodeGet(KNF_NODE_PORT_STATUS, statusParams, &info->status), "Port Status");
 }
 
+void KeepStatus(const PortStatusRecord &status, PortIdentity *info) {
+    auto size = static_cast<u32>(std::strlen(status.clientName) + 1);
+    if (size > info->clientRoom) {
+        std::free(info->clientName);
+        info->clientName = static_cast<char *>(AllocOrPanic(size, "Client Name"));
+        info->clientRoom = size;
+    }
+    std::memcpy(info->clientName, status.clientName, size);
+    info->statusFlags = status.statusFlags;
+    info->rxMode = status.rxMode;
+}
+
+void KeepInfo(const PortInfo &from, PortIdentity *info) {
+    std::size_t size = std::strlen(from.type.switchName) + 1;
+    info->portNum = from.portNum;
+    info->type = from.type.type;
+    info->subType = from.type.subType;
+    info->switchName = static_cast<char *>(AllocOrPanic(size, "Switch Name"));
+    std::memcpy(info->switchName, from.type.switchName, size);
+    std::memcpy(info->macText, from.macText, sizeof info->macText);
+    KeepStatus(from.status, info);
+}
+
 // Lists and keys of a new port; false, logged, when one can't be made.
 bool CreateLists(Port *port) {
     auto portNum = static_cast<i64>(port->info.portNum);
@@ -89,7 +113,7 @@ bool CreateLists(Port *port) {
         LogMsg(0, "Unable to create instance list\n");
         return false;
     }
-    if (AddPortKeys(port->portParams, &port->info) != 0) {
+    if (AddPortKeys(port->portParams, port->info) != 0) {
         LogMsg(0, "Unable to populate knf instance param for port %Ld\n", portNum);
         return false;
     }
@@ -98,7 +122,7 @@ bool CreateLists(Port *port) {
         LogMsg(0, "Unable to create port queue params list\n");
         return false;
     }
-    if (AddPortKeys(port->queueParams, &port->info) != 0) {
+    if (AddPortKeys(port->queueParams, port->info) != 0) {
         LogMsg(0, "Unable to populate knf queue param for port %Ld\n", portNum);
         return false;
     }
@@ -121,24 +145,24 @@ PortPrefs DefaultPrefs(u32 type) {
 // At most one NIC companion, by the port's type.
 void CreateNic(Port *port) {
     bool nic = (*port->prefs & PREF_VNIC) != 0;
-    u32 type = port->info.type.type;
+    u32 type = port->info.type;
     if (nic && type == PORT_TYPE_UPLINK) {
-        port->physnic = PhysNicCreate(port->info.status.clientName, port->prefs);
+        port->physnic = PhysNicCreate(port->info.clientName, port->prefs);
     } else if (nic && type == PORT_TYPE_HOST_NIC) {
         port->hostNic = HostNicCreate();
     } else if (type == PORT_TYPE_VNIC && (*port->prefs & (PREF_VNIC | PREF_COALESCE)) != 0) {
-        port->vnic = VnicCreate(port->info.type.subType, port->prefs);
+        port->vnic = VnicCreate(port->info.subType, port->prefs);
     }
 }
 
 // The port's worldlets are those that bear the name of its NIC, or the world leader of its virtual machine.
-void CreateWorldlets(Port *port) {
+void CreateWorldlets(Port *port, u32 worldLeader) {
     char mask[128] = "";
-    u32 type = port->info.type.type;
+    u32 type = port->info.type;
     if (type == PORT_TYPE_UPLINK || type == PORT_TYPE_HOST_NIC) {
-        Str_Snprintf(mask, sizeof mask, "%s", port->info.status.clientName);
+        Str_Snprintf(mask, sizeof mask, "%s", port->info.clientName);
     } else if (type == PORT_TYPE_VNIC) {
-        Str_Snprintf(mask, sizeof mask, "NetWdt-Async-%u", port->info.status.worldLeader);
+        Str_Snprintf(mask, sizeof mask, "NetWdt-Async-%u", worldLeader);
     }
     if (mask[0] != '\0') {
         port->wdt = WdtCreate(mask);
@@ -146,14 +170,13 @@ void CreateWorldlets(Port *port) {
 }
 
 // Null companions are no failure. False, logged, when the histograms' argument list can't be made.
-bool CreateCompanions(Port *port) {
-    u32 worldLeader = port->info.status.worldLeader;
+bool CreateCompanions(Port *port, u32 worldLeader) {
     if (worldLeader != 0) {
         port->numVcpus = VcpusCreate(worldLeader, (*port->prefs & PREF_VCPU_HISTO) != 0, &port->vcpus);
     }
     CreateNic(port);
     if ((*port->prefs & PREF_WDT) != 0) {
-        CreateWorldlets(port);
+        CreateWorldlets(port, worldLeader);
     }
     if ((*port->prefs & (PREF_HISTO | PREF_HISTO_ARGS)) != 0) {
         port->histoParams = KNF_ParamListCreate(KNF_INPUT_LIST, 2);
@@ -179,6 +202,8 @@ void Unwind(Port *port) {
     HostNicCleanup(port->hostNic);
     PhysNicCleanup(port->physnic);
     WdtCleanup(port->wdt);
+    std::free(port->info.switchName);
+    std::free(port->info.clientName);
     std::free(port->curStats);
     std::free(port->prevStats);
     std::free(port->prefs);
@@ -298,7 +323,7 @@ Port *PortCreate(u64 portNum, const PortPrefs *prefs) {
     port->curStats = AllocRecord<PortClientStats>("Client Stats");
     port->prevStats = AllocRecord<PortClientStats>("Client Stats");
     port->prefs = AllocRecord<PortPrefs>("PortPrefs");
-    PortInfo &info = port->info;
+    static PortInfo info;  // whole records, for the time of a creation
     if (GetPortsInfo(portNum, &info) != 0) {
         LogMsg(1, "Unable to get port info for port %Ld\n", static_cast<i64>(portNum));
         Unwind(port);
@@ -307,7 +332,8 @@ Port *PortCreate(u64 portNum, const PortPrefs *prefs) {
     LogMsg(1, "Port %Lu Switch %s Client:%s Type: %d SubType: %d\n", portNum, info.type.switchName,
            info.status.clientName, static_cast<i32>(info.type.type), static_cast<i32>(info.type.subType));
     *port->prefs = prefs != nullptr ? *prefs : DefaultPrefs(info.type.type);
-    if (!CreateLists(port) || !CreateCompanions(port)) {
+    KeepInfo(info, &port->info);
+    if (!CreateLists(port) || !CreateCompanions(port, info.status.worldLeader)) {
         Unwind(port);
         return nullptr;
     }
@@ -324,9 +350,11 @@ KnfStatus PortRead(Port *port, bool first) {
         port->vcpus = nullptr;
         port->numVcpus = 0;
     }
-    if (KnfStatus status = NodeGet(KNF_NODE_PORT_STATUS, port->portParams, &port->info.status)) {
+    static PortStatusRecord record;  // one for all ports, which keep little of it
+    if (KnfStatus status = NodeGet(KNF_NODE_PORT_STATUS, port->portParams, &record)) {
         return Disable(port, status, "portStatus");
     }
+    KeepStatus(record, &port->info);
     PortClientStats *stats = first ? port->prevStats : port->curStats;
     if (KnfStatus status = NodeGet(KNF_NODE_PORT_CLIENT_STATS, port->portParams, stats)) {
         return Disable(port, status, "clientStats");
@@ -353,13 +381,12 @@ KnfStatus PortPrint(Port *port, ReportBuf *report) {
         return 0;
     }
     f32 elapsed = Divisor(port);
-    const PortStatusRecord &status = port->info.status;
+    const PortIdentity &info = port->info;
     ReportPrintf(report,
                  "\"name\": \"%s\", \"switch\": \"%s\", \"id\": %Ld, \"mac\": \"%s\", \"rxmode\": %d, "
                  "\"uplink\": \"%s\"",
-                 status.clientName, port->info.type.switchName, static_cast<i64>(port->info.portNum),
-                 port->info.macText, static_cast<i32>(status.rxMode),
-                 (status.statusFlags & PORT_STATUS_UPLINK) != 0 ? "true" : "false");
+                 info.clientName, info.switchName, static_cast<i64>(info.portNum), info.macText,
+                 static_cast<i32>(info.rxMode), (info.statusFlags & PORT_STATUS_UPLINK) != 0 ? "true" : "false");
     PrintClientStats(port, elapsed, report);
     port->elapsed = elapsed;
     port->prevTime = port->curTime;

@@ -69,16 +69,30 @@ struct __attribute__((packed)) PortClientStats {
 static_assert(sizeof(PortClientStats) == 160 && offsetof(PortClientStats, txBytesExtra) == 32 &&
               offsetof(PortClientStats, rxPkts) == 72 && offsetof(PortClientStats, rxDropped) == 88);
 
+// The identity of a port as its records tell it. Of use for a while: a port keeps an extract, as the records are large
+// rooms for short texts.
 struct PortInfo {
     u64 portNum;
     PortTypeRecord type;
     PortStatusRecord status;
-    char macText[18];  // six octets in lower-case hexadecimal, as of creation
+    char macText[18];  // six octets in lower-case hexadecimal
+};
+
+struct PortIdentity {
+    u64 portNum;
+    u32 type;
+    u32 subType;
+    char *switchName;  // owned, like clientName
+    char macText[18];  // this and what is above: as of creation
+    char *clientName;  // this and what is below: as of the last pass
+    u32 clientRoom;    // bytes at clientName
+    u32 statusFlags;
+    u32 rxMode;
 };
 
 struct Port {
-    u8 active;                 // 0 after a failed read that disabled the port, for good
-    PortInfo info;             // its status record is as of the last pass
+    u8 active;  // 0 after a failed read that disabled the port, for good
+    PortIdentity info;
     f32 elapsed;               // seconds, the divisor of the latest report
     KnfParamList portParams;   // switch name, port number
     KnfParamList queueParams;  // the same, with room for a queue number
