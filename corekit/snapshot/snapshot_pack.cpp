@@ -66,21 +66,24 @@ u64 Crc64(std::string_view bytes) {
         }
         return rows;
     }();
+    const u64 *rows = table.data();
     u64 sum = ~u64{0};
     for (char byte : bytes) {
-        sum = table[(sum ^ static_cast<u8>(byte)) & 255] ^ sum >> 8;
+        sum = rows[(sum ^ static_cast<u8>(byte)) & 255] ^ sum >> 8;
     }
     return ~sum;
 }
 
 std::string Pack(std::string_view bytes) {
+    // Places are counted on from call to call, which spares clearing the slots for each page.
+    static thread_local std::vector<u64> latest(size_t{1} << SLOT_BITS, 0);  // 1 behind the place that was seen last
+    static thread_local u64 begin = 0;                                       // the place of the first byte
     std::string packed;
-    std::vector<size_t> latest(size_t{1} << SLOT_BITS, 0);  // of each slot, 1 behind the place that was seen last
-    size_t literals = 0;                                    // where those begin that wait to be written
+    size_t literals = 0;  // where those begin that wait to be written
     for (size_t at = 0; at + MIN_COPY <= bytes.size(); at++) {
-        size_t seen = std::exchange(latest[SlotAt(bytes, at)], at + 1);
-        size_t distance = at + 1 - seen;
-        if (seen == 0 || distance > MAX_DISTANCE || at < literals) {
+        u64 seen = std::exchange(latest[SlotAt(bytes, at)], begin + at + 1);
+        u64 distance = begin + at + 1 - seen;
+        if (seen <= begin || distance > MAX_DISTANCE || at < literals) {
             continue;
         }
         size_t end = at;
@@ -95,6 +98,7 @@ std::string Pack(std::string_view bytes) {
     if (literals < bytes.size()) {
         AppendSequence(&packed, bytes.substr(literals), 0, 0);
     }
+    begin += bytes.size();
     return packed;
 }
 
