@@ -7,13 +7,27 @@
 #include <fstream>
 #include <gtest/gtest.h>
 #include <memory>
+#include <sys/resource.h>
 #include <unistd.h>
+
+static int failingNew;  // the allocation from now on that fails, counted from 1
+
+__attribute__((noinline)) void *operator new(std::size_t size) {
+    return failingNew > 0 && --failingNew == 0 ? throw std::bad_alloc() : std::malloc(size);
+}
+__attribute__((noinline)) void operator delete(void *memory) noexcept {
+    std::free(memory);
+}
+__attribute__((noinline)) void operator delete(void *memory, std::size_t) noexcept {
+    std::free(memory);
+}
 
 namespace {
 
-KnfStatus Use(const std::string &file) {
+KnfStatus Use(const std::string &file, u64 padding = 0) {
     std::string path = testing::TempDir() + "snapshot-" + std::to_string(getpid());
     std::ofstream(path, std::ios::binary) << file;
+    EXPECT_EQ(truncate(path.c_str(), static_cast<off_t>(file.size() + padding)), 0);
     KnfStatus status = KNF_UseCache(path.c_str(), 0);
     unlink(path.c_str());
     return status;
@@ -69,22 +83,24 @@ TEST(Snapshot, BadFilesAreToldApartAndNothingIsServed) {
     const std::string good = SnapshotEncode(SmallDraft());
     std::string flipped = good;
     flipped[SNAPSHOT_HEADER + 30] ^= 4;
-    const std::pair<std::string, const char *> rows[] = {
-        {"", "Snapshot file is truncated"},
-        {good.substr(0, good.size() - 1), "Snapshot file is truncated"},
-        {flipped, "Snapshot file is corrupted"},
-        {"{ \"sysinfo\": { \"hostname\": \"h\" } }", "Not a snapshot file"},
-        {Repaired(good, 8, {0, 0, 0, 2}), "Snapshot of another format version or byte order"},
-        {Repaired(good, 12, {1, 2, 3, 4}), "Snapshot of another format version or byte order"},
-        {"/nowhere/file", "Snapshot file can't be read"},
-        {"/tmp", "Snapshot file can't be read"},
+    const std::tuple<std::string, const char *, u64> rows[] = {
+        {"no snapshot", "Not a snapshot file", SNAPSHOT_LIMIT / 2},
+        {good, "Snapshot file is corrupted", SNAPSHOT_LIMIT / 2},
+        {good, "Snapshot file can't be read", SNAPSHOT_LIMIT},
+        {"", "Snapshot file is truncated", 0},
+        {good.substr(0, good.size() - 1), "Snapshot file is truncated", 0},
+        {flipped, "Snapshot file is corrupted", 0},
+        {Repaired(good, 8, {0, 0, 0, 2}), "Snapshot of another format version or byte order", 0},
+        {Repaired(good, 12, {1, 2, 3, 4}), "Snapshot of another format version or byte order", 0},
+        {"/nowhere/file", "Snapshot file can't be read", 0},
+        {"/tmp", "Snapshot file can't be read", 0},
     };
     CorekitUnload();
-    for (const auto &[file, text] : rows) {
+    for (const auto &[file, text, padding] : rows) {
         std::string record(100, '\0');
         EXPECT_EQ(Use(good), STATUS_OK);
         EXPECT_EQ(Get(269, PORT, &record), STATUS_OK);
-        KnfStatus status = file[0] == '/' ? KNF_UseCache(file.c_str(), 0) : Use(file);
+        KnfStatus status = file[0] == '/' ? KNF_UseCache(file.c_str(), 0) : Use(file, padding);
         EXPECT_STREQ(HCK_ReturnStatusToString(status), text);
         const char *ours = nullptr;
         char signature[21] = {};
@@ -93,6 +109,36 @@ TEST(Snapshot, BadFilesAreToldApartAndNothingIsServed) {
             EXPECT_NE(KNF_CheckSig(signature, sizeof signature, &ours), STATUS_OK) << text;
             EXPECT_STREQ(signature, "");
         }
+    }
+    rusage usage = {};
+    getrusage(RUSAGE_SELF, &usage);
+    EXPECT_LT(usage.ru_maxrss, 400 << 10) << "KiB: what the header tells was looked for behind it";
+}
+
+TEST(Snapshot, WhatTheFormatForbidsIsCorrupt) {
+    // A list of that many empty texts, alone in its page but for what stands ahead of it when packed, and behind it.
+    auto listed = [](size_t texts, const std::string &ahead = "", const std::string &behind = "") {
+        SnapshotDraft draft;
+        std::string sizes, &list = draft.entries[SnapshotName(ENTRY_LIST, 245, {})];
+        while (list.size() < 2 * texts) {
+            SnapshotAppendParam(&list, ParamOf(""));
+        }
+        AppendNumber(&sizes, 10 + list.size() + behind.size(), 4);
+        AppendNumber(&sizes, 10 + list.size() + behind.size() + ahead.size(), 4);
+        std::string file = SnapshotEncode(draft);
+        file.insert(file.size() - SNAPSHOT_CHECKSUM, behind);
+        return Repaired(file.insert(SNAPSHOT_HEADER + 18, ahead), SNAPSHOT_HEADER, sizes);
+    };
+    EXPECT_EQ(Parse(listed(SNAPSHOT_PARAMS)), STATUS_OK);
+    const std::pair<std::string, const char *> rows[] = {
+        {listed(SNAPSHOT_PARAMS + 1), "a list that is too long"},
+        {listed(SNAPSHOT_PARAMS, "", SnapshotName(ENTRY_RECORD, 246, {}) + std::string(4, 0)), "a large page of two"},
+        {listed(2, "\xe0"), "a packed page (one of 14 literals) that is larger than it is unpacked"},
+        {Repaired(listed(2), 95, "x"), "a signature without an end"},
+        {Repaired(listed(2), 80, "x"), "bytes behind a signature's end"},
+    };
+    for (const auto &[file, what] : rows) {
+        EXPECT_EQ(Parse(file), STATUS_SNAPSHOT_CORRUPT) << what;
     }
 }
 
@@ -112,7 +158,11 @@ TEST(Snapshot, EveryInstanceIsFoundAmongManyPages) {
     for (int64_t i = 0; i < 10000; i += 3) {
         int64_t port = i * 7919 % 10000 * 2 - 1;
         std::string record(708, '\0');
-        ASSERT_EQ(Get(269, {ParamOf(port)}, &record), STATUS_OK) << port;
+        KnfParamListRec key = {KNF_INSTANCE_LIST, 1, {ParamOf(port)}};
+        failingNew = static_cast<int>(i % 16);
+        KNF_Get(269, &key, record.data(), 708);
+        failingNew = 0;
+        ASSERT_EQ(Get(269, {ParamOf(port)}, &record), STATUS_OK) << port << ", for which memory was short before";
         ASSERT_EQ(record, draft.entries[SnapshotName(ENTRY_RECORD, 269, {ParamOf(port)})]);
     }
     KnfParamListRec key = {KNF_INSTANCE_LIST, 1, {ParamOf(int64_t{10001})}};

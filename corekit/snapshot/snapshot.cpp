@@ -14,11 +14,30 @@ namespace {
 
 constexpr char KEY_NUMBER = 'i';
 constexpr char KEY_TEXT = 's';
-constexpr u32 NAME_END = 6;  // bytes of a name behind its keys: a byte of 0, the kind, the node
+constexpr u32 NAME_END = 6;    // bytes of a name behind its keys: a byte of 0, the kind, the node
+constexpr u32 PAGE_HEAD = 12;  // bytes ahead of the name of a page's first entry
 
-// Passes over parameters, into `params` unless that is null, up to what is none.
+// Closes what it was given, -1 for nothing.
+struct File {
+    int fd;
+    explicit File(int opened) : fd(opened) {}
+    File(const File &) = delete;
+    File &operator=(const File &) = delete;
+    ~File() {
+        if (fd >= 0) {
+            close(fd);
+        }
+    }
+};
+
+// Passes over parameters, into `params` unless that is null, up to what is none. More than a name or a list may have
+// are as bad as one that is cut.
 void TakeParams(Cursor *from, Params *params) {
-    while (!from->left.empty() && (from->left[0] == KEY_NUMBER || from->left[0] == KEY_TEXT)) {
+    for (u32 count = 1; !from->left.empty() && (from->left[0] == KEY_NUMBER || from->left[0] == KEY_TEXT); count++) {
+        if (count > SNAPSHOT_PARAMS) {
+            *from = {{}, false};
+            return;
+        }
         bool isText = from->Take(1)[0] == KEY_TEXT;
         std::string_view text = isText ? from->Text() : std::string_view();
         auto number = static_cast<int64_t>(isText ? 0 : from->Number(8));
@@ -37,63 +56,113 @@ bool IsBody(u8 kind, std::string_view body) {
     return from.good && (kind == ENTRY_RECORD || (kind == ENTRY_LIST && from.left.empty()));
 }
 
-// Finds the entries of a page. False unless all are well formed and their names ascend.
-bool FindPlaces(std::string_view bytes, std::vector<LoadedPage::Place> *places) {
-    places->clear();
-    for (Cursor from{bytes}; !from.left.empty();) {
-        std::string_view rest = from.left;
-        TakeParams(&from, nullptr);
-        Cursor end{from.Take(NAME_END)};
-        std::string_view name = rest.substr(0, rest.size() - from.left.size());
-        std::string_view body = from.Take(from.Number(4));
-        bool ends = end.Number(1) == 0 && IsBody(static_cast<u8>(end.Number(1)), body);
-        if (!from.good || !ends || (!places->empty() && name <= places->back().first)) {
-            return false;
-        }
-        places->push_back({name, body});
-    }
-    return !places->empty();
+struct Entry {
+    std::string_view name;
+    std::string_view body;
+};
+
+Entry TakeEntry(Cursor *from) {
+    std::string_view rest = from->left;
+    TakeParams(from, nullptr);
+    from->Take(NAME_END);
+    std::string_view name = rest.substr(0, rest.size() - from->left.size());
+    return {name, from->Take(from->Number(4))};
 }
 
-bool LoadPage(const SnapshotPage &page, LoadedPage *loaded) {
-    std::string_view bytes = page.bytes;
-    if (page.size != bytes.size()) {
-        loaded->unpacked.resize(page.size);
-        bytes = loaded->unpacked;
-        if (!Unpack(page.bytes, &loaded->unpacked)) {
+Entry EntryAt(const LoadedPage &page, u32 place) {
+    Cursor from{page.bytes.substr(place)};
+    return TakeEntry(&from);
+}
+
+// Finds the entries of a page. False unless all are well formed, their names ascend, and a large one is alone.
+bool FindPlaces(LoadedPage *page) {
+    bool single = page->bytes.size() > SNAPSHOT_PAGE;
+    page->places.clear();
+    std::string_view before;
+    for (Cursor from{page->bytes}; !from.left.empty();) {
+        size_t place = page->bytes.size() - from.left.size();
+        auto [name, body] = TakeEntry(&from);
+        if (!from.good || name <= before || (single && place > 0)) {
+            return false;
+        }
+        Cursor end{name.substr(name.size() - NAME_END)};
+        if (end.Number(1) != 0 || !IsBody(static_cast<u8>(end.Number(1)), body)) {
+            return false;
+        }
+        page->places.push_back(static_cast<u32>(place));
+        before = name;
+    }
+    return !page->places.empty();
+}
+
+struct PageHead {
+    u64 size;                // unpacked; that of `bytes` when they are not packed
+    std::string_view first;  // the name of its first entry
+    std::string_view bytes;
+};
+
+PageHead TakePage(Cursor *from) {
+    u64 size = from->Number(4);
+    u64 packedSize = from->Number(4);
+    std::string_view first = from->Take(from->Number(4));
+    return {size, first, from->Take(packedSize)};
+}
+
+PageHead PageAt(const Snapshot &snapshot, u32 at) {
+    Cursor from{std::string_view(snapshot.file).substr(at)};
+    return TakePage(&from);
+}
+
+// Only when all of it succeeded, `at` tells the page: memory may run out on the way.
+bool LoadPage(const PageHead &head, u32 at, LoadedPage *page) {
+    page->at = 0;
+    page->bytes = head.bytes;
+    if (head.size != head.bytes.size()) {
+        page->unpacked.resize(head.size);
+        page->bytes = page->unpacked;
+        if (!Unpack(head.bytes, &page->unpacked)) {
             return false;
         }
     }
-    loaded->page = &page;
-    return FindPlaces(bytes, &loaded->places) && loaded->places[0].first == page.first;
+    bool good = FindPlaces(page) && EntryAt(*page, 0).name == head.first;
+    page->at = good ? at : 0;
+    return good;
 }
 
 // The page in memory, where the one that was not used for longest makes room.
-const LoadedPage &Loaded(Snapshot *snapshot, const SnapshotPage &page) {
+const LoadedPage &Loaded(Snapshot *snapshot, u32 at) {
     LoadedPage *oldest = snapshot->loaded;
     for (LoadedPage &loaded : snapshot->loaded) {
-        oldest = loaded.page == &page || (oldest->page != &page && loaded.used < oldest->used) ? &loaded : oldest;
+        oldest = loaded.at == at || (oldest->at != at && loaded.used < oldest->used) ? &loaded : oldest;
     }
     oldest->used = ++snapshot->lookUps;
-    if (oldest->page != &page) {
-        LoadPage(page, oldest);  // succeeded when the snapshot was opened
+    if (oldest->at != at) {
+        LoadPage(PageAt(*snapshot, at), at, oldest);  // succeeded when the snapshot was opened
     }
     return *oldest;
 }
 
+// No name begins with another, so that as many bytes as the sought one has tell the order: an entry's need no parsing.
 KnfStatus Find(void *context, EntryKind kind, u32 node, const Params &keys, std::string_view *body) {
     auto *snapshot = static_cast<Snapshot *>(context);
     std::string name = SnapshotName(kind, node, keys);
-    auto behind = std::upper_bound(snapshot->pages.begin(), snapshot->pages.end(), name,
-                                   [](std::string_view left, const SnapshotPage &right) { return left < right.first; });
+    std::string_view file = snapshot->file;
+    auto behind = std::upper_bound(
+        snapshot->pages.begin(), snapshot->pages.end(), std::string_view(name),
+        [&](std::string_view left, u32 at) { return left < file.substr(at + PAGE_HEAD, left.size()); });
     if (behind == snapshot->pages.begin()) {
         return STATUS_NOT_FOUND;
     }
-    const auto &places = Loaded(snapshot, *std::prev(behind)).places;
-    auto place = std::lower_bound(places.begin(), places.end(), LoadedPage::Place(name, {}));
-    bool found = place != places.end() && place->first == name;
-    *body = found ? place->second : std::string_view();
-    return found ? STATUS_OK : STATUS_NOT_FOUND;
+    const LoadedPage &page = Loaded(snapshot, *std::prev(behind));
+    auto place = std::lower_bound(
+        page.places.begin(), page.places.end(), std::string_view(name),
+        [&](u32 left, std::string_view right) { return page.bytes.substr(left, right.size()) < right; });
+    Cursor from{page.bytes.substr(place != page.places.end() ? *place : page.bytes.size())};
+    if (from.Take(name.size()) != name) {
+        return STATUS_NOT_FOUND;
+    }
+    *body = from.Take(from.Number(4));
+    return STATUS_OK;
 }
 
 KnfStatus Get(void *context, u32 node, const Params &keys, void *record, u32 size) {
@@ -118,27 +187,62 @@ const char *Signature(void *context) {
     return static_cast<Snapshot *>(context)->signature.c_str();
 }
 
-// The pages between header and checksum. False unless each holds what it says, and all their names ascend.
-bool FindPages(Cursor from, std::vector<SnapshotPage> *pages) {
+// The pages behind the header. False unless each holds what it says, and all their names ascend.
+bool FindPages(Cursor from, std::vector<u32> *pages) {
     LoadedPage loaded;
     std::string before;  // the last name of the page ahead
+    u64 end = SNAPSHOT_HEADER + from.left.size();
     while (!from.left.empty()) {
-        u64 size = from.Number(4);
-        u64 packedSize = from.Number(4);
-        std::string_view first = from.Take(from.Number(4));
-        SnapshotPage page = {first, from.Take(packedSize), size};
-        bool fits = size == packedSize || size <= SNAPSHOT_PAGE;
-        if (!from.good || !fits || first <= before || !LoadPage(page, &loaded)) {
+        auto at = static_cast<u32>(end - from.left.size());
+        PageHead head = TakePage(&from);
+        bool fits = head.size == head.bytes.size() || (head.size > head.bytes.size() && head.size <= SNAPSHOT_PAGE);
+        if (!from.good || !fits || head.first <= before || !LoadPage(head, at, &loaded)) {
             return false;
         }
-        before = loaded.places.back().first;
-        pages->push_back(page);
+        before = EntryAt(loaded, loaded.places.back()).name;
+        pages->push_back(at);
     }
     return true;
 }
 
 std::string ByteOrder() {
     return std::string(reinterpret_cast<const char *>(&SNAPSHOT_BYTE_ORDER), sizeof SNAPSHOT_BYTE_ORDER);
+}
+
+// What the beginning of a file of this size tells, ahead of all other checks.
+KnfStatus CheckHeader(std::string_view header, u64 size) {
+    if (size > SNAPSHOT_LIMIT) {
+        return STATUS_SNAPSHOT_UNREADABLE;
+    }
+    if (header.substr(0, SNAPSHOT_MAGIC.size()) != SNAPSHOT_MAGIC.substr(0, header.size())) {
+        return STATUS_NOT_SNAPSHOT;
+    }
+    Cursor from{header};
+    from.Take(SNAPSHOT_MAGIC.size());
+    u64 version = from.Number(4);
+    bool sameOrder = from.Take(4) == ByteOrder();
+    if (from.good && (version != SNAPSHOT_VERSION || !sameOrder)) {
+        return STATUS_SNAPSHOT_VERSION;
+    }
+    u64 length = from.Number(8);
+    if (size < SNAPSHOT_HEADER + SNAPSHOT_CHECKSUM || size < length) {
+        return STATUS_SNAPSHOT_TRUNCATED;
+    }
+    return size == length ? STATUS_OK : STATUS_SNAPSHOT_CORRUPT;
+}
+
+// Reads on until `bytes` has this size. False when the file ends before, or can't be read.
+bool ReadUpTo(int fd, u64 size, std::string *bytes) {
+    size_t done = bytes->size();
+    bytes->resize(size);
+    while (done < size) {
+        ssize_t count = read(fd, bytes->data() + done, size - done);
+        if (count == 0 || (count < 0 && errno != EINTR)) {
+            return false;
+        }
+        done += static_cast<size_t>(std::max<ssize_t>(count, 0));
+    }
+    return true;
 }
 
 void AppendPage(std::string *file, const std::string &first, const std::string &bytes) {
@@ -166,46 +270,40 @@ int WriteSynced(int fd, std::string_view bytes) {
 
 KnfStatus SnapshotOpen(const char *path, Snapshot *snapshot) {
     // Not to wait for the other end of a pipe, which is no snapshot anyway.
-    int fd = open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK);
-    if (fd < 0) {
+    File from{open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK)};
+    struct stat info = {};
+    if (from.fd < 0 || fstat(from.fd, &info) != 0 || !S_ISREG(info.st_mode)) {
         return STATUS_SNAPSHOT_UNREADABLE;
     }
-    struct stat info = {};
-    bool good = fstat(fd, &info) == 0 && S_ISREG(info.st_mode) && static_cast<u64>(info.st_size) <= SNAPSHOT_LIMIT;
-    std::string file(good ? static_cast<size_t>(info.st_size) : 0, '\0');
-    for (size_t done = 0; good && done < file.size();) {
-        ssize_t count = read(fd, file.data() + done, file.size() - done);
-        good = count > 0;
-        done += static_cast<size_t>(std::max<ssize_t>(count, 0));
+    auto size = static_cast<u64>(info.st_size);
+    std::string file;
+    if (!ReadUpTo(from.fd, std::min<u64>(size, SNAPSHOT_HEADER), &file)) {
+        return STATUS_SNAPSHOT_UNREADABLE;
     }
-    close(fd);
-    return good ? SnapshotParse(std::move(file), snapshot) : STATUS_SNAPSHOT_UNREADABLE;
+    // A large file that is something else is not read any further.
+    KnfStatus status = CheckHeader(file, size);
+    if (status == STATUS_OK && !ReadUpTo(from.fd, size, &file)) {
+        status = STATUS_SNAPSHOT_UNREADABLE;
+    }
+    return status == STATUS_OK ? SnapshotParse(std::move(file), snapshot) : status;
 }
 
 KnfStatus SnapshotParse(std::string file, Snapshot *snapshot) {
     snapshot->file = std::move(file);
     std::string_view bytes = snapshot->file;
-    Cursor from{bytes};
-    if (bytes.substr(0, SNAPSHOT_MAGIC.size()) != SNAPSHOT_MAGIC.substr(0, bytes.size())) {
-        return STATUS_NOT_SNAPSHOT;
-    }
-    from.Take(SNAPSHOT_MAGIC.size());
-    u64 version = from.Number(4);
-    bool sameOrder = from.Take(4) == ByteOrder();
-    if (from.good && (version != SNAPSHOT_VERSION || !sameOrder)) {
-        return STATUS_SNAPSHOT_VERSION;
-    }
-    u64 length = from.Number(8);
-    snapshot->seconds = static_cast<u32>(from.Number(4));
-    snapshot->nanoseconds = static_cast<u32>(from.Number(4));
-    snapshot->signature = Cursor{from.Take(SNAPSHOT_SIGNATURE)}.Text();
-    if (bytes.size() < SNAPSHOT_HEADER + SNAPSHOT_CHECKSUM || bytes.size() < length) {
-        return STATUS_SNAPSHOT_TRUNCATED;
+    KnfStatus status = CheckHeader(bytes, bytes.size());
+    if (status != STATUS_OK) {
+        return status;
     }
     Cursor sum{bytes.substr(bytes.size() - SNAPSHOT_CHECKSUM)};
     bytes.remove_suffix(SNAPSHOT_CHECKSUM);
-    from.left.remove_suffix(SNAPSHOT_CHECKSUM);
-    bool intact = length == snapshot->file.size() && sum.Number(8) == Crc64(bytes);
+    Cursor from{bytes.substr(SNAPSHOT_TIME)};
+    snapshot->seconds = static_cast<u32>(from.Number(4));
+    snapshot->nanoseconds = static_cast<u32>(from.Number(4));
+    std::string_view signature = from.Take(SNAPSHOT_SIGNATURE);
+    snapshot->signature = signature.substr(0, signature.find('\0'));
+    bool filled = signature.back() == 0 && signature.find_first_not_of('\0', snapshot->signature.size()) == bytes.npos;
+    bool intact = filled && sum.Number(SNAPSHOT_CHECKSUM) == Crc64(bytes);
     return intact && FindPages(from, &snapshot->pages) ? STATUS_OK : STATUS_SNAPSHOT_CORRUPT;
 }
 
@@ -214,8 +312,10 @@ NodeSource SnapshotSource(Snapshot *snapshot) {
 }
 
 void SnapshotEach(Snapshot *snapshot, const std::function<void(const SnapshotEntry &)> &visit) {
-    for (const SnapshotPage &page : snapshot->pages) {
-        for (const auto &[name, body] : Loaded(snapshot, page).places) {
+    for (u32 at : snapshot->pages) {
+        std::vector<u32> places = Loaded(snapshot, at).places;  // a copy, as a visit may load other pages
+        for (u32 place : places) {
+            auto [name, body] = EntryAt(Loaded(snapshot, at), place);
             SnapshotEntry entry = {};
             entry.record = body;
             Cursor from{name};

@@ -1,7 +1,7 @@
 // Snapshots: files that hold the records and instance lists of a host as they stood at one moment, served as a source
 // of nodes. docs/snapshot-format.md tells the format. A file is checked whole when it is opened, in time linear in its
-// size. Memory is a small multiple of the file's size and room for a few unpacked pages; no number in a file makes the
-// reader allocate more than that.
+// size. Memory is less than twice the file's size and room for a few unpacked pages and the list that is asked for; no
+// number in a file makes the reader allocate more than that.
 #pragma once
 
 #include "corekit/node_source.h"
@@ -9,34 +9,28 @@
 
 #include <functional>
 #include <map>
-#include <utility>
 #include <vector>
 
 constexpr std::string_view SNAPSHOT_MAGIC = "KNFSNAP\n";
 constexpr u32 SNAPSHOT_VERSION = 1;
 constexpr u32 SNAPSHOT_BYTE_ORDER = 0x01020304;  // stored as a record stores it
 constexpr u32 SNAPSHOT_SIGNATURE = 64;           // bytes of the text's span
+constexpr u32 SNAPSHOT_TIME = 24;                // where in the header its time begins
 constexpr u32 SNAPSHOT_HEADER = 96;
 constexpr u32 SNAPSHOT_CHECKSUM = 8;
-constexpr u32 SNAPSHOT_PAGE = 512 * 1024;  // bytes of the largest packed page, unpacked
+constexpr u32 SNAPSHOT_PAGE = 512 * 1024;  // unpacked bytes of the largest page that is packed or has two entries
 constexpr u64 SNAPSHOT_LIMIT = 1 << 30;    // bytes of the largest file
+constexpr u32 SNAPSHOT_PARAMS = 1 << 18;   // keys of a name, entries of a list: in memory, each takes much more room
 
 enum EntryKind : u8 { ENTRY_LIST = 'l', ENTRY_RECORD = 'r' };
 
 // A part of the file that is unpacked as one. All its names lie below those of the next page.
-struct SnapshotPage {
-    std::string_view first;  // the name of its first entry
-    std::string_view bytes;
-    size_t size;  // unpacked; that of `bytes` when they are not packed
-};
-
 struct LoadedPage {
-    using Place = std::pair<std::string_view, std::string_view>;  // a name and what it names
-
-    const SnapshotPage *page = nullptr;
+    u32 at = 0;    // where it begins in the file; 0 while none is loaded
     u64 used = 0;  // the look-up that used it last
     std::string unpacked;
-    std::vector<Place> places;  // names ascend
+    std::string_view bytes;   // of `unpacked`, or of the file when the page is not packed
+    std::vector<u32> places;  // where its entries begin in `bytes`; names ascend
 };
 
 // Stays where it was opened: its pages point into its bytes.
@@ -45,7 +39,7 @@ struct Snapshot {
     std::string signature;
     u32 seconds = 0;  // the time in the header
     u32 nanoseconds = 0;
-    std::vector<SnapshotPage> pages;
+    std::vector<u32> pages;  // where each begins in the file
     u64 lookUps = 0;
     LoadedPage loaded[8];
 };
