@@ -52,7 +52,7 @@ TEST(Replay, ReportsWhatALiveRunOfTheSameMomentsReports) {
     std::string table = RunMeter("", "-l").out;
     MeterRun recorder = Record("", "-o s -i 10 -n 3");
     EXPECT_EQ(recorder.err + recorder.journal, "");
-    EXPECT_TRUE(recorder.out.ends_with("\nlan-meter -c s.0:s.1:s.2\n")) << recorder.out;
+    EXPECT_TRUE(recorder.out.ends_with("\nlan-meter -A -c s.0:s.1:s.2\n")) << recorder.out;
     EXPECT_EQ(Count(recorder.out, " 0 reads failed\n"), 3U);
     for (const char *more : {"", "-n 1 -i 86400", "-t vqiWch"}) {
         MeterRun run = RunMeter("", std::string("-c s.0:s.1:s.2 -A -t vqiWc -d 2 ") + more, {"", true});
@@ -138,26 +138,55 @@ TEST(Replay, FilesOfTheFirstVersionAreStillRead) {
     EXPECT_EQ(Count(dump, "list 641 9 = \"nic0\" \"timer\"\n"), 1U);
 }
 
-TEST(Recorder, LeavesOutAndCountsWhatCanNotBeRead) {
-    MeterRun run = Record(HOST + "remove 1419\nfault get 269\nfault list 639\n", "-o part -n 1");
-    EXPECT_EQ(Count(run.out, "; 4 reads failed\n"), 1U) << run.out;
+TEST(Recorder, LeavesOutWhatCanNotBeReadAndCountsEachOnce) {
+    MeterRun run = Record(HOST + "vnic switch=sw0 port=10 vm=v model=parlan3\nremove 1419\nfault get 269\n"
+                                 "fault get 772\nfault list 639\n",
+                          "-o part -n 1");
+    EXPECT_EQ(Count(run.out, " 4 lists, "), 1U) << run.out << "of switches, ports, vcpus and worldlets";
+    EXPECT_EQ(Count(run.out, "; 6 reads failed\n"), 1U) << run.out;
     std::string dump = Record("", "--dump part.0").out;
     EXPECT_EQ(Count(dump, " time=0.000000000 signature \"Mar 14 2024 09:26:53\"\n"), 1U);
-    EXPECT_EQ(Count(dump, "\nlist 264 \"sw0\" = 7 9\n"), 1U);
+    EXPECT_EQ(Count(dump, "\nlist 264 \"sw0\" = 7 9 10\n"), 1U);
     EXPECT_EQ(Count(dump, "record 269 ") + Count(dump, "record 1419 ") + Count(dump, "list 639 "), 0U);
 }
 
 TEST(Recorder, StopsAtASignalWithTheFilesSoFar) {
-    std::string command = "timeout --preserve-status -s INT 0.5 ${METER% *} " RECORD_BINARY " -o stop -i 100 -n 3";
-    MeterRun run = RunScript(HOST, command + " >out 2>err", {"", true});
-    EXPECT_EQ(std::to_string(run.status) + run.err, "0");
-    EXPECT_TRUE(run.out.ends_with("\nlan-meter -c stop.0\n")) << run.out;
-    EXPECT_EQ(RunScript("", "ls | grep -c stop >out").out, "1\n");
-    EXPECT_EQ(RunMeter("", "-c stop.0 -p 7").status, 0);
+    const std::tuple<const char *, const char *, const char *, const char *> rows[] = {
+        {"INT 0.5 ", "-i 100 -n 3", "0knf-record: stopped after 1 of 3 snapshots: Interrupt\n", "-l -c stop.0\n"},
+        {"HUP 0.5 ", "-i 100 -n 3", "0knf-record: stopped after 1 of 3 snapshots: Hangup\n", "-l -c stop.0\n"},
+        {"HUP 0.5 nohup ", "-i 1 -n 2 </dev/null", "0", "-A -c stop.0:stop.1\n"},
+    };
+    for (const auto &[signal, arguments, messages, replay] : rows) {
+        std::string command = std::string("timeout --preserve-status -s ") + signal + "${METER% *} " RECORD_BINARY;
+        MeterRun run = RunScript(HOST, command + " -o stop >out 2>err " + arguments, {"", true});
+        EXPECT_EQ(std::to_string(run.status) + run.err, messages);
+        EXPECT_TRUE(run.out.ends_with(std::string("\nlan-meter ") + replay)) << run.out;
+    }
+    EXPECT_EQ(RunScript("", "ls | grep -c stop >out").out, "2\n");
 }
 
-TEST(Recorder, FullDiskLeavesTheOldFileAlone) {
-    RunScript(HOST, "echo old >full.0; (trap '' XFSZ; ulimit -f 1; ${METER% *} COREKIT_TRACE= " RECORD_BINARY
-                    " -o full >record 2>err); echo $? $(cat err) $(ls full*) $(cat full.0) >out");
-    EXPECT_EQ(RunFile("out"), "1 knf-record: full.0: File too large full.0 old\n");
+TEST(Recorder, SaysWhatIsWrongAndHarmsNoFile) {
+    const std::string numbers = ": expected a whole number of ";
+    const std::pair<const char *, std::string> rows[] = {
+        {"$R -n 0 -o x 2>&1 | head -n 1", "knf-record: -n 0" + numbers + "snapshots from 1 to 1000000\n"},
+        {"$R -i 0.5 -o x 2>&1 | head -n 1", "knf-record: -i 0.5" + numbers + "seconds from 0 to 86400\n"},
+        {"echo old >full.0; (ulimit -f 1; $R -o full); echo $? $(ls full*) $(cat full.0)",
+         "knf-record: full.0: File too large\n1 full.0 old\n"},
+        // A writer of the same number in another name space, one that lives and one that was killed.
+        {"touch two.0.4242.partial two.3.0badcafe.partial; umask 027\n"
+         "flock two.0.00c0ffee.partial $R -o two -n 1 >/dev/null; ls two*; stat -c %a two.0",
+         "two.0\ntwo.0.00c0ffee.partial\ntwo.0.4242.partial\n640\n"},
+        {"mkdir -p shut; chmod 300 shut; [ $(id -u) != 0 ] || limit='setpriv --bounding-set=-all'\n"
+         "$limit $R -o shut/x >/dev/null; chmod 700 shut; ls shut",
+         "x.0\nx.1\n"},
+        {"mkfifo pipe; exec 3<>pipe 4>pipe 3>&-; $R -o p >&4; echo $? $(ls p.*)",
+         "knf-record: standard output: Broken pipe\n1 p.0 p.1\n"},
+        {"$R -o \"it's \\$HOME\" >said; eval \"$METER $(sed -n 's/^lan-meter//p' said)\" | grep -c '^{ \"time\"'",
+         "1\n"},
+    };
+    for (const auto &[script, expected] : rows) {
+        RunScript(HOST,
+                  std::string("R=\"${METER% *} COREKIT_TRACE= " RECORD_BINARY " -i 0\"; exec >out 2>&1; ") + script);
+        EXPECT_EQ(RunFile("out"), expected) << script;
+    }
 }

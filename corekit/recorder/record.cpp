@@ -72,13 +72,21 @@ struct KeyList {
     ~KeyList() { KNF_ParamListDestroy(list); }
 };
 
-bool Counted(Recorder *recorder, KnfStatus status, u64 *successes) {
-    (status == 0 ? *successes : recorder->failed)++;
+// Whether it was not tried before.
+bool Wanted(const Recorder &recorder, const std::string &name) {
+    return *recorder.stop == 0 && !recorder.missing.contains(name) && !recorder.draft.entries.contains(name);
+}
+
+bool Counted(Recorder *recorder, const std::string &name, bool good, u64 *successes) {
+    (good ? *successes : recorder->failed)++;
+    if (!good) {
+        recorder->missing.insert(name);
+    }
     u64 reads = recorder->records + recorder->lists + recorder->failed;
     if (recorder->showProgress && reads % 512 == 0) {
         fprintf(stderr, "\r%llu reads", reads);
     }
-    return status == 0;
+    return good;
 }
 
 // A record that was read; nothing if it could not be.
@@ -89,38 +97,44 @@ std::string_view Known(const Recorder &recorder, u32 node, const Params &keys) {
 
 // The record, or nothing when it can't be read.
 std::string_view Read(Recorder *recorder, u32 node, const Params &keys) {
-    std::string_view known = Known(*recorder, node, keys);
-    if (!known.empty() || *recorder->stop != 0) {
-        return known;
+    std::string name = SnapshotName(ENTRY_RECORD, node, keys);
+    if (!Wanted(*recorder, name)) {
+        return Known(*recorder, node, keys);
     }
     u32 size = NodeRecordSize(node);
     std::string record(size, '\0');
     KnfStatus status = KNF_Get(node, KeyList(keys).list, record.data(), size);
-    if (!Counted(recorder, status, &recorder->records)) {
+    if (!Counted(recorder, name, status == 0, &recorder->records)) {
         return {};
     }
-    return recorder->draft.entries[SnapshotName(ENTRY_RECORD, node, keys)] = std::move(record);
+    return recorder->draft.entries[name] = std::move(record);
 }
 
 // What a list's entries are; the interface does not tell.
 enum EntryType : u8 { NUMBERS, TEXTS };
 
+// Nothing for a list that was read before, as what it leads to was read then.
 Params List(Recorder *recorder, u32 node, const Params &keys, EntryType type) {
     Params entries;
-    std::string body;
-    KnfParamList list = nullptr;
-    if (*recorder->stop != 0 ||
-        !Counted(recorder, KNF_GetInstanceListAlloc(node, KeyList(keys).list, &list), &recorder->lists)) {
+    std::string name = SnapshotName(ENTRY_LIST, node, keys);
+    if (!Wanted(*recorder, name)) {
         return entries;
     }
-    for (u32 i = 0; i < KNF_ParamListUsedCount(list); i++) {
-        KnfParam entry = KNF_ParamListGetParam(list, i);
-        entries.push_back(type == TEXTS ? ParamOf(std::string(KNF_ParamGetString(entry)))
-                                        : ParamOf(KNF_ParamGetInt(entry)));
-        SnapshotAppendParam(&body, entries.back());
+    KnfParamList list = nullptr;
+    KnfStatus status = KNF_GetInstanceListAlloc(node, KeyList(keys).list, &list);
+    u32 count = status == 0 ? KNF_ParamListUsedCount(list) : 0;
+    if (Counted(recorder, name, status == 0 && count <= SNAPSHOT_PARAMS, &recorder->lists)) {
+        std::string &body = recorder->draft.entries[name];
+        for (u32 i = 0; i < count; i++) {
+            KnfParam entry = KNF_ParamListGetParam(list, i);
+            entries.push_back(type == TEXTS ? ParamOf(std::string(KNF_ParamGetString(entry)))
+                                            : ParamOf(KNF_ParamGetInt(entry)));
+            SnapshotAppendParam(&body, entries.back());
+        }
     }
-    KNF_ParamListDestroy(list);
-    recorder->draft.entries[SnapshotName(ENTRY_LIST, node, keys)] = std::move(body);
+    if (status == 0) {
+        KNF_ParamListDestroy(list);
+    }
     return entries;
 }
 

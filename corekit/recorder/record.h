@@ -5,6 +5,8 @@
 #include "corekit/snapshot/snapshot.h"
 
 #include <csignal>
+#include <set>
+#include <string>
 
 struct Recorder {
     SnapshotDraft draft;
@@ -13,6 +15,7 @@ struct Recorder {
     u64 failed = 0;
     const volatile std::sig_atomic_t *stop;  // once it is set, nothing more is read
     bool showProgress;                       // on standard error
+    std::set<std::string> missing = {};      // names of what can't be read
 };
 
 void RecordHost(Recorder *recorder);

@@ -3,9 +3,13 @@
 #include "corekit/node_source.h"
 
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
+#include <dirent.h>
 #include <fcntl.h>
 #include <iterator>
+#include <sys/file.h>
+#include <sys/random.h>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <utility>
@@ -16,6 +20,8 @@ constexpr char KEY_NUMBER = 'i';
 constexpr char KEY_TEXT = 's';
 constexpr u32 NAME_END = 6;    // bytes of a name behind its keys: a byte of 0, the kind, the node
 constexpr u32 PAGE_HEAD = 12;  // bytes ahead of the name of a page's first entry
+constexpr std::string_view PARTIAL = ".partial";
+constexpr size_t PARTIAL_DIGITS = 8;
 
 // Closes what it was given, -1 for nothing.
 struct File {
@@ -263,7 +269,54 @@ int WriteSynced(int fd, std::string_view bytes) {
         }
         bytes.remove_prefix(static_cast<size_t>(std::max<ssize_t>(count, 0)));
     }
-    return fsync(fd) == 0 ? 0 : errno;
+    int error = 0;
+    do {
+        error = fsync(fd) == 0 ? 0 : errno;
+    } while (error == EINTR);
+    return error;
+}
+
+// A new file beside `path`, locked as long as its writer lives: process numbers tell nothing to another name space of
+// processes or another host. Returns -1 with errno when there is none.
+int CreatePartial(const std::string &path, std::string *name) {
+    for (int attempts = 0; attempts < 100; attempts++) {
+        u32 number = 0;
+        if (getrandom(&number, sizeof number, 0) != sizeof number) {
+            return -1;
+        }
+        char digits[PARTIAL_DIGITS + 1];
+        snprintf(digits, sizeof digits, "%08x", number);
+        *name = path + "." + digits + std::string(PARTIAL);
+        int fd = open(name->c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0644);
+        if (fd < 0 && errno == EEXIST) {
+            continue;
+        }
+        // Until it is locked, SnapshotClear may take it away. Where there are no locks, that leaves all files alone.
+        struct stat info = {};
+        bool locked = fd < 0 || flock(fd, LOCK_EX | LOCK_NB) == 0 || errno != EWOULDBLOCK;
+        if (fd < 0 || (locked && fstat(fd, &info) == 0 && info.st_nlink > 0)) {
+            return fd;
+        }
+        close(fd);
+    }
+    errno = EEXIST;
+    return -1;
+}
+
+std::string DirectoryOf(const std::string &path) {
+    size_t slash = path.rfind('/');
+    return slash == path.npos ? "." : path.substr(0, slash + 1);
+}
+
+// Whether this is what CreatePartial makes for a path of `base` and a number.
+bool IsPartial(std::string_view name, std::string_view base) {
+    if (!name.starts_with(base) || !name.substr(base.size()).ends_with(PARTIAL)) {
+        return false;
+    }
+    name = name.substr(base.size(), name.size() - base.size() - PARTIAL.size());
+    size_t dot = name.find_first_not_of("0123456789");
+    return dot > 0 && dot < name.size() && name[dot] == '.' && name.size() - dot - 1 == PARTIAL_DIGITS &&
+           name.find_first_not_of("0123456789abcdef", dot + 1) == name.npos;
 }
 
 }  // namespace
@@ -381,14 +434,12 @@ int SnapshotStore(const std::string &path, std::string_view file) {
     if (file.size() > SNAPSHOT_LIMIT) {
         return EFBIG;
     }
-    std::string beside = path + "." + std::to_string(getpid()) + ".partial";
-    unlink(beside.c_str());
-    int fd = open(beside.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0644);
-    if (fd < 0) {
+    std::string beside;
+    File partial{CreatePartial(path, &beside)};
+    if (partial.fd < 0) {
         return errno;
     }
-    int error = WriteSynced(fd, file);
-    close(fd);
+    int error = WriteSynced(partial.fd, file);
     if (error == 0 && rename(beside.c_str(), path.c_str()) != 0) {
         error = errno;
     }
@@ -396,10 +447,29 @@ int SnapshotStore(const std::string &path, std::string_view file) {
         unlink(beside.c_str());
         return error;
     }
-    // The rename itself lasts once the directory is on disk.
-    size_t slash = path.rfind('/');
-    fd = open(slash == path.npos ? "." : path.substr(0, slash + 1).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    error = fd >= 0 && fsync(fd) == 0 ? 0 : errno;
-    close(fd);
-    return error;
+    // The rename itself lasts once the directory is on disk. One that may not be read can't be synced; the file's own
+    // sync is the closest then. Whatever these say, the file is in place.
+    File directory{open(DirectoryOf(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)};
+    fsync(directory.fd >= 0 ? directory.fd : partial.fd);
+    return 0;
+}
+
+void SnapshotClear(const std::string &prefix) {
+    DIR *directory = opendir(DirectoryOf(prefix).c_str());
+    if (directory == nullptr) {
+        return;
+    }
+    std::string base = prefix.substr(prefix.rfind('/') + 1) + ".";
+    while (const dirent *entry = readdir(directory)) {
+        if (!IsPartial(entry->d_name, base)) {
+            continue;
+        }
+        File file{openat(dirfd(directory), entry->d_name, O_WRONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC)};
+        struct stat info = {};
+        if (file.fd >= 0 && fstat(file.fd, &info) == 0 && S_ISREG(info.st_mode) &&
+            flock(file.fd, LOCK_EX | LOCK_NB) == 0) {
+            unlinkat(dirfd(directory), entry->d_name, 0);
+        }
+    }
+    closedir(directory);
 }

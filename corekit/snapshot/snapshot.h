@@ -75,3 +75,6 @@ std::string SnapshotEncode(const SnapshotDraft &draft);  // the whole file
 
 // Afterwards `path` is this file, or what it was before. Returns 0 or an errno.
 int SnapshotStore(const std::string &path, std::string_view file);
+
+// Removes the partial files of PREFIX.NUMBER whose writers were killed. One that is still written stays.
+void SnapshotClear(const std::string &prefix);
