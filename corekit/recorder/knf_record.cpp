@@ -68,17 +68,18 @@ Settings ParseArguments(int argc, char **argv) {
         }
     }
     std::string problem;
+    bool either = (settings.prefix == nullptr) != (settings.dump == nullptr);
     if (settings.valid && optind < argc) {
         problem = std::string(argv[optind]) + ": expected an option";
-    } else if (settings.valid && (settings.prefix == nullptr) == (settings.dump == nullptr)) {
+    } else if (settings.valid && !either) {
         problem = "expected either -o PREFIX or --dump FILE";
     } else if (settings.prefix != nullptr && strchr(settings.prefix, ':') != nullptr) {
         problem = "a colon in PREFIX would part the list of files in a replay";
     }
     if (!problem.empty() && !settings.help) {
         fprintf(stderr, "knf-record: %s\n", problem.c_str());
-        settings.valid = false;
     }
+    settings.valid = settings.valid && either && problem.empty();
     return settings;
 }
 
@@ -165,7 +166,7 @@ int Record(const Settings &settings) {
     bool good = true;
     bool printed = true;
     i64 taken = 0;
-    for (; taken < settings.count && good; taken += good) {
+    for (; taken < settings.count && good; taken += good ? 1 : 0) {
         if (taken > 0) {
             Wait(settings.interval, signals);
         }
