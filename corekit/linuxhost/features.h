@@ -3,7 +3,7 @@
 // and changes nothing on the host.
 #pragma once
 
-#include "corekit/linuxhost/proc/file.h"
+#include "corekit/linuxhost/file.h"
 
 enum Answer : u8 { ANSWER_NO, ANSWER_YES, ANSWER_NOT_ALLOWED, ANSWER_CANT_TELL };
 

@@ -4,7 +4,7 @@
 // that holds a tap, names of kernel threads of kernel threads.
 #pragma once
 
-#include "corekit/linuxhost/proc/file.h"
+#include "corekit/linuxhost/file.h"
 
 struct WorkerThread {
     u32 pid;  // the same as tid for a kernel thread

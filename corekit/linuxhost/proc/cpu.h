@@ -2,7 +2,7 @@
 // about 5 us a CPU and generation. Times have the kernel's grain, 10 ms on nearly every build.
 #pragma once
 
-#include "corekit/linuxhost/proc/file.h"
+#include "corekit/linuxhost/file.h"
 
 struct CpuTopology {
     u32 cpus;      // possible ones: numbers run from 0 to this - 1; at least 1

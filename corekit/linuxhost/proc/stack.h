@@ -2,7 +2,7 @@
 // /proc/net/snmp, netstat and snmp6, found by key. One read of the three a generation, about 90 us, kept open.
 #pragma once
 
-#include "corekit/linuxhost/proc/file.h"
+#include "corekit/linuxhost/file.h"
 
 // In the order of the table in stack.cpp, which has the kernel's name of each.
 // clang-format off

@@ -3,7 +3,7 @@
 // sched file where no event is allowed. Owns two descriptors a thread.
 #pragma once
 
-#include "corekit/linuxhost/proc/file.h"
+#include "corekit/linuxhost/file.h"
 
 #include <memory>
 #include <unordered_map>
