@@ -24,6 +24,7 @@ struct ProcFile {
     int directory = -1;  // not owned, must outlive the file
     int descriptor = -1;
     bool kept = false;   // counts against the shared limit
+    bool line = false;   // one line that is written at once: whole when its end is read, which saves a call
     u32 limit = 0;       // bytes; a longer file is BROKEN, never cut
     std::string path{};  // under the directory
 };
@@ -44,6 +45,9 @@ Outcome ProcReadOnce(int directory, const std::string &path, u32 limit, ProcBuff
 
 // Files kept open from now on, for all rooms together; what is kept stays. A test sets a low one.
 void ProcLimitKept(u32 files);
+// For a descriptor of another kind that its owner wants to keep: false when there is no room, which is said once.
+bool ProcKeepOne();
+void ProcReleaseOne();
 
 // Steps through text that may be anything. Each takes what it returns off the front of `rest`.
 std::string_view ProcTakeLine(std::string_view *rest);  // without its end

@@ -1,11 +1,11 @@
-// Times of all possible CPUs from one read of /proc/stat a generation, and their topology from /sys, read once. Costs
-// about 5 us a CPU and generation. Times have the kernel's grain, 10 ms on nearly every build.
+// Times of all CPUs, those that are off too, from one read of /proc/stat a generation, and their topology from /sys,
+// read once. Costs about 5 us a CPU and generation. Times have the kernel's grain, 10 ms on nearly every build.
 #pragma once
 
 #include "corekit/linuxhost/file.h"
 
 struct CpuTopology {
-    u32 cpus;      // possible ones: numbers run from 0 to this - 1; at least 1
+    u32 cpus;      // that are there, on or off: numbers run from 0 to this - 1; at least 1
     u32 packages;  // at least 1, so are the cores; of the CPUs that are on, as the kernel tells no others
     u32 cores;
     u32 lastCacheSharers;  // CPUs that share the last-level cache of the first CPU; 0 when the kernel does not tell
@@ -39,3 +39,8 @@ Outcome CpusOpen(Cpus *cpus, const ProcRoot &root);
 // Reads all rows, unless they are of this generation (not 0) already.
 Outcome CpusRead(Cpus *cpus, u64 generation);
 void CpusClose(Cpus *cpus);
+
+// Of a list as the kernel writes it, "0-3,8": the CPU that the last-level cache of all of them is known by, and the
+// only CPU in it. NO_CPU when there is none.
+u32 CpuListCache(const CpuTopology &topology, std::string_view list);
+u32 CpuListOnly(std::string_view list);

@@ -5,7 +5,6 @@
 
 #include "corekit/linuxhost/file.h"
 
-#include <memory>
 #include <unordered_map>
 
 // What a caller wants of a thread, and what a row knows. Unwanted figures are not read.
@@ -28,15 +27,30 @@ struct ThreadRow {
     u64 remoteWakeups;  // by another CPU
 };
 
-struct Thread;
 struct CpuTopology;
+
+// A watched thread, for thread.cpp alone.
+struct Thread {
+    u32 wanted = 0;
+    u64 generation = 0;
+    bool sampled = false;  // the row is of that generation
+    bool gone = false;
+    u64 started = 0;      // ticks since boot; tells a thread from a later one of the same number
+    u64 affinityAge = 0;  // ns of CLOCK_BOOTTIME when it was told
+    int perf = -1;        // counts migrations
+    bool perfTried = false;
+    std::string directory;  // "PID/task/TID/"
+    ProcFile times{};
+    ProcFile sched{};
+    ThreadRow row{};
+};
 
 struct Threads {
     const ProcRoot *root = nullptr;
     const CpuTopology *topology = nullptr;  // for `cache`; may be null
     bool allowPerf = true;
-    bool schedstats = false;                                // kernel.sched_schedstats
-    std::unordered_map<u64, std::unique_ptr<Thread>> open;  // by TID
+    bool schedstats = false;               // kernel.sched_schedstats
+    std::unordered_map<u64, Thread> open;  // by TID
     ProcBuffer buffer;
 };
 
