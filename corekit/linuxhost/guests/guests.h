@@ -30,7 +30,7 @@ struct HeldTap {
 
 struct Guests {
     std::vector<Guest> guests;       // ascending PIDs
-    std::vector<HeldTap> taps;       // once each, by the first process that holds it
+    std::vector<HeldTap> taps;       // once each, by indices, then names
     std::vector<WorkerThread> nics;  // kernel threads "napi/..." and "irq/..."
     u32 processes;                   // seen
     u32 refused;                     // of them, whose descriptors are not for this user
@@ -47,6 +47,3 @@ Outcome GuestsScan(const ProcRoot &root, Guests *guests);
 
 // The tap of an interface, by its name or, for a macvtap, its index; null when nobody is known to hold it.
 const HeldTap *GuestsFind(const Guests &guests, const char *name, u32 index);
-
-// What a command line says, arguments ended by 0 each. Empty when it has no name. Any byte but 0.
-std::string GuestName(std::string_view command);
