@@ -14,6 +14,7 @@ enum FeatureId : u32 {
     FEATURE_MIGRATIONS,      // threads tell their migrations in text
     FEATURE_PERF,            // a perf event counts migrations of others' threads
     FEATURE_REMOTE_WAKEUPS,  // kernel.sched_schedstats is on
+    FEATURE_ONE_CACHE,       // all CPUs share one last-level cache
     FEATURE_LINK_COUNTERS,   // RTM_GETSTATS
     FEATURE_QUEUES,          // netdev family: queues of a NIC
     FEATURE_QUEUE_COUNTERS,  // netdev family: counters of a queue
@@ -24,7 +25,8 @@ enum FeatureId : u32 {
 
 struct Feature {
     const char *name;
-    const char *version;  // the mainline kernel that first has it, for people; empty when older than 4.18
+    const char *version;  // the mainline kernel that first has it, for people; empty for what has long been there or is
+                          // no matter of version
     Answer (*ask)(const ProcRoot &root);
     const char *without;  // what is served without it
     const char *cure;     // what would bring it
