@@ -72,11 +72,10 @@ Answer AskTapHolders(const ProcRoot &root) {
     return answer;
 }
 
-// A kernel that does not account shows three zeros.
+// A kernel that does not account shows three zeros. We have run at least once, though a young thread's time may be 0.
 Answer AskSchedstat(const ProcRoot &root) {
     Text file(root, "thread-self/schedstat");
-    u64 run = 0;
-    bool counted = ProcTakeNumber(&file.text, &run) && run > 0;
+    bool counted = file.text.find_first_of("123456789") != std::string_view::npos;
     return file.outcome == FINE && !counted ? ANSWER_NO : OfOutcome(file.outcome);
 }
 
