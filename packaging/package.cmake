@@ -1,5 +1,6 @@
-# What is installed, and the two Debian packages: the program, and the stand-in with the recorder. A host that has the
-# library of its own installs the first alone, so that it never gets ours.
+# What is installed, and the two Debian packages: the program, and our library with its sources of nodes, the recorder
+# and the command that tells what a host offers. A host that has the library of its own installs the first alone, so
+# that it never gets ours.
 include(GNUInstallDirs)
 
 install(TARGETS lan-meter RUNTIME DESTINATION ${CMAKE_INSTALL_SBINDIR} COMPONENT meter)
@@ -10,9 +11,9 @@ install(FILES packaging/lan-meter.bash DESTINATION ${CMAKE_INSTALL_DATADIR}/bash
   RENAME lan-meter COMPONENT meter)
 
 install(TARGETS corekit LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT corekit)
-install(TARGETS knf-record RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT corekit)
-install(FILES docs/man/knf-record.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 COMPONENT corekit)
-install(FILES docs/host-description.md docs/snapshot-format.md
+install(TARGETS knf-record knf-source RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT corekit)
+install(FILES docs/man/knf-record.1 docs/man/knf-source.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 COMPONENT corekit)
+install(FILES docs/linux.md docs/host-description.md docs/snapshot-format.md
   DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/lan-meter-corekit COMPONENT corekit)
 
 set(CPACK_GENERATOR DEB)
@@ -32,8 +33,9 @@ set(CPACK_COMPONENT_METER_DESCRIPTION "Network statistics of a hypervisor host's
  each port, as one JSON document. Needs the host's libcorekit.so.")
 set(CPACK_DEBIAN_COREKIT_PACKAGE_NAME lan-meter-corekit)
 set(CPACK_DEBIAN_COREKIT_PACKAGE_SECTION libs)
-set(CPACK_DEBIAN_COREKIT_PACKAGE_DEPENDS "libc6 (>= 2.36), libstdc++6 (>= 12), libgcc-s1")
-set(CPACK_COMPONENT_COREKIT_DESCRIPTION "Stand-in for a host's libcorekit.so, and its recorder
- Plays a simulated host where the hypervisor's own library is absent, and
- records and serves snapshots. Not for a host that has the library.")
+set(CPACK_DEBIAN_COREKIT_PACKAGE_DEPENDS "libc6 (>= 2.36), libstdc++6 (>= 12), libgcc-s1, libmnl0 (>= 1.0.4)")
+set(CPACK_COMPONENT_COREKIT_DESCRIPTION "libcorekit.so for Linux hosts, its recorder and a command that tells its worth
+ Reads bridges, NICs, KVM guests and the IP stack of a Linux host, plays a
+ simulated one, and records and serves snapshots. Not for a host that has a
+ libcorekit.so of its own.")
 include(CPack)

@@ -79,12 +79,6 @@ Answer AskSchedstat(const ProcRoot &root) {
     return file.outcome == FINE && !counted ? ANSWER_NO : OfOutcome(file.outcome);
 }
 
-Answer AskMigrations(const ProcRoot &root) {
-    Text file(root, "thread-self/sched");
-    bool told = file.text.find("nr_migrations") != std::string_view::npos;
-    return file.outcome == FINE && !told ? ANSWER_NO : OfOutcome(file.outcome);
-}
-
 Answer AskPerf(const ProcRoot &) {
     perf_event_attr attributes = {};
     attributes.size = sizeof attributes;
@@ -96,6 +90,12 @@ Answer AskPerf(const ProcRoot &) {
         close(static_cast<int>(descriptor));
     }
     return error == ESRCH ? ANSWER_CANT_TELL : OfOutcome(ErrnoOutcome(error));
+}
+
+// In text, else by an event.
+Answer AskMigrations(const ProcRoot &root) {
+    Text file(root, "thread-self/sched");
+    return file.text.find("nr_migrations") != std::string_view::npos ? ANSWER_YES : AskPerf(root);
 }
 
 Answer AskRemoteWakeups(const ProcRoot &root) {
@@ -257,9 +257,9 @@ constexpr Feature TABLE[] = {
     {"times of threads", "", AskSchedstat,
      "no vcpus and no worldlets",
      "a kernel with CONFIG_SCHED_INFO"},
-    {"migrations in text", "", AskMigrations,
-     "migrations by perf event alone",
-     "a kernel that has /proc/PID/sched"},
+    {"migrations of threads", "", AskMigrations,
+     "0, which nobody measured",
+     "a kernel that has /proc/PID/sched, or what allows perf events"},
     {"migrations by perf event", "", AskPerf,
      "migrations from /proc/PID/task/TID/sched, which takes about 10 us more a thread",
      "root, CAP_PERFMON and CAP_SYS_PTRACE, or for guests of this user kernel.perf_event_paranoid=1"},

@@ -11,7 +11,7 @@ enum FeatureId : u32 {
     FEATURE_PROCESSES,       // other users' processes show in /proc
     FEATURE_TAP_HOLDERS,     // descriptors of other users' processes can be looked at
     FEATURE_SCHEDSTAT,       // threads tell their times
-    FEATURE_MIGRATIONS,      // threads tell their migrations in text
+    FEATURE_MIGRATIONS,      // migrations of threads are told, in text or by an event
     FEATURE_PERF,            // a perf event counts migrations of others' threads
     FEATURE_REMOTE_WAKEUPS,  // kernel.sched_schedstats is on
     FEATURE_ONE_CACHE,       // all CPUs share one last-level cache

@@ -13,14 +13,15 @@ constexpr size_t FIRST_READ = 4096;
 constexpr u32 RESERVE = 64;  // descriptors left to the program that loaded us
 
 u32 keptFiles = 0;
-u32 keptLimit = 0;  // 0: not asked yet
+constexpr u32 UNASKED = 0xffffffff;
+u32 keptLimit = UNASKED;
 bool shortageTold = false;
 
 u32 KeptLimit() {
-    if (keptLimit == 0) {
+    if (keptLimit == UNASKED) {
         rlimit limit = {};
         rlim_t soft = getrlimit(RLIMIT_NOFILE, &limit) == 0 ? limit.rlim_cur : 0;
-        keptLimit = soft > RESERVE ? static_cast<u32>(std::min<rlim_t>(soft - RESERVE, 1 << 20)) : 1;
+        keptLimit = soft > RESERVE ? static_cast<u32>(std::min<rlim_t>(soft - RESERVE, 1 << 20)) : 0;
     }
     return keptLimit;
 }

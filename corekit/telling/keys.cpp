@@ -55,7 +55,7 @@ const KeyRow KEY_ROWS[] = {
     {"ports.physnic.rxmbps", EXACT, "bytes of the NIC"},
     {"ports.physnic.rxsize", EXACT, "bytes by packets"},
     {"ports.physnic.rxeps", EXACT, "rx_errors, rx_dropped and rx_missed, as far as the driver counts"},
-    {"ports.txqueue.count", EXACT, "queues of the NIC", FEATURE_QUEUES, EXACT},
+    {"ports.txqueue.count", EXACT, "queues of the NIC; 0 when it has several and nobody counts them one by one", FEATURE_QUEUES, EXACT},
     {"ports.txqueue.details.pps", EXACT, "counters of the queue", FEATURE_QUEUE_COUNTERS, CLOSE},
     {"ports.txqueue.details.eps", EXACT, "counters of the queue", FEATURE_QUEUE_COUNTERS, CLOSE},
     {"ports.txqueue.details.qstops", EXACT, "where the driver counts them, from kernel 6.10 on; else 0, not measured",
