@@ -62,6 +62,8 @@ const char *StatusText(KnfStatus status) {
         return "Snapshot file is truncated";
     case STATUS_SNAPSHOT_CORRUPT:
         return "Snapshot file is corrupted";
+    case STATUS_UNTOLD:
+        return "Not told by the kernel";
     case STATUS_SIMULATED:
         return "Simulated failure";
     default:

@@ -35,6 +35,7 @@ constexpr KnfStatus STATUS_SNAPSHOT_UNREADABLE = 0xbad000a;
 constexpr KnfStatus STATUS_SNAPSHOT_VERSION = 0xbad000b;
 constexpr KnfStatus STATUS_SNAPSHOT_TRUNCATED = 0xbad000c;
 constexpr KnfStatus STATUS_SNAPSHOT_CORRUPT = 0xbad000d;
+constexpr KnfStatus STATUS_UNTOLD = 0xbad0010;     // the kernel refuses, or lacks, what would tell
 constexpr KnfStatus STATUS_SIMULATED = 0xbad000f;  // of a fault that names no status of its own
 
 const char *StatusText(KnfStatus status);  // of every possible value
@@ -48,6 +49,9 @@ struct NodeSource {
                      uint32_t size);
     // The build text of the kernel that the source shows, terminated.
     const char *(*signature)(void *context);
+    // Port histograms are out of its reach: a text in the input of a write is refused, which makes a caller give up
+    // ahead of its reads. A text is input of theirs alone.
+    bool withoutHistograms = false;
 };
 
 constexpr char HOST_SIGNATURE[] = "Mar 14 2024 09:26:53";  // the build that programs are made against

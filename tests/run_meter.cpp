@@ -50,8 +50,8 @@ MeterRun RunScript(const std::string &host, const std::string &script, const Run
     std::string meter = "env COREKIT_TRACE=trace COREKIT_JOURNAL=journal " + options.environment;
     if (!host.empty()) {
         WriteRunFile("host.txt", host);
-        meter += " COREKIT_HOST=host.txt";
     }
+    meter += host.empty() ? " COREKIT_HOST=demo" : " COREKIT_HOST=host.txt";
     if (!options.realClock) {
         meter += " ASAN_OPTIONS=verify_asan_link_order=0 LD_PRELOAD=" FIXED_CLOCK;
     }

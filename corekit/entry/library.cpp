@@ -2,6 +2,7 @@
 #include "corekit/entry/control.h"
 #include "corekit/entry/faults.h"
 #include "corekit/entry/journal.h"
+#include "corekit/linuxhost/source.h"
 #include "corekit/node_source.h"
 #include "corekit/simulated/default_host.h"
 #include "corekit/simulated/description.h"
@@ -21,9 +22,14 @@
 
 namespace {
 
+struct LinuxHostCloser {
+    void operator()(LinuxHost *host) const { LinuxHostClose(host); }
+};
+
 struct Library {
-    std::unique_ptr<Host> host;
-    NodeSource live = {};
+    std::unique_ptr<Host> host;  // at most one of these two
+    std::unique_ptr<LinuxHost, LinuxHostCloser> machine;
+    NodeSource live = {};                // of it; its functions are null while nothing is connected
     std::unique_ptr<Snapshot> snapshot;  // the one in use
     NodeSource cache = {};
     const NodeSource *current = nullptr;  // what reads are served from; null while nothing is connected
@@ -77,6 +83,11 @@ Result Contained(Result failed, Body body) {
 
 KnfStatus AddParam(KnfParamList list, const KnfParamRec &param) {
     KnfStatus status = CheckCall({CALL_ADD, 0, nullptr, &param});
+    const NodeSource *source = Lib().current;
+    if (status == STATUS_OK && source != nullptr && source->withoutHistograms && param.isText && list != nullptr &&
+        list->kind == KNF_INPUT_LIST) {
+        status = STATUS_NOT_WRITABLE;
+    }
     if (status == STATUS_OK) {
         status = ParamListAdd(list, param);
     }
@@ -101,13 +112,17 @@ bool Load(const std::string &text, const char *file, std::string *error) {
     return true;
 }
 
-// The host of COREKIT_HOST, else the built-in one.
-bool LoadNamed() {
-    const char *path = getenv("COREKIT_HOST");
+void LoadMachine() {
+    Library &library = Lib();
+    CorekitUnload();
+    library.machine.reset(LinuxHostOpen());
+    library.live = LinuxHostSource(library.machine.get());
+    library.current = &library.live;
+}
+
+bool LoadDescribed(const char *path) {
     std::string text = DefaultHostText();
-    if (path == nullptr || *path == 0) {
-        path = "default-host";
-    } else {
+    if (strcmp(path, "demo") != 0) {
         std::ifstream file(path);
         if (!file) {
             fprintf(stderr, "%s: %s: expected a readable host description\n", path, strerror(errno));
@@ -121,6 +136,16 @@ bool LoadNamed() {
         fprintf(stderr, "%s\n", error.c_str());
     }
     return loaded;
+}
+
+// This machine, unless COREKIT_HOST names another host.
+bool LoadNamed() {
+    const char *path = getenv("COREKIT_HOST");
+    if (path != nullptr && *path != 0) {
+        return LoadDescribed(path);
+    }
+    LoadMachine();
+    return true;
 }
 
 }  // namespace
@@ -287,7 +312,7 @@ KnfStatus KNF_UseCache(const char *path, uint32_t) {
 KnfStatus KNF_CacheCleanup(void) {
     Library &library = Lib();
     library.snapshot = nullptr;
-    library.current = library.host != nullptr ? &library.live : nullptr;
+    library.current = library.live.get != nullptr ? &library.live : nullptr;
     return Told(STATUS_OK, "cache-cleanup", nullptr, {});
 }
 

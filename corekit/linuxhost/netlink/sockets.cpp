@@ -73,7 +73,8 @@ void Join(TcpSockets *sockets, const std::vector<TcpSocket> &found, bool lost) {
     std::vector<TcpSocket> all(found);
     if (lost) {  // whatever is no longer shown has ended, and nobody will say so
         for (const TcpSocket &old : sockets->living) {
-            if (!std::binary_search(found.begin(), found.end(), old, ByCookie)) {
+            bool told = std::binary_search(sockets->ended.begin(), sockets->ended.end(), old, ByCookie);
+            if (!told && !std::binary_search(found.begin(), found.end(), old, ByCookie)) {
                 Add(&sockets->past, old.totals);
             }
         }

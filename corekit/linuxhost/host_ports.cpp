@@ -1,0 +1,314 @@
+#include "corekit/linuxhost/host.h"
+#include "corekit/linuxhost/host_nodes.h"
+
+#include <algorithm>
+#include <linux/netlink.h>
+#include <net/if.h>
+
+namespace {
+
+constexpr int DEPTH = 8;  // of interfaces that belong to one another
+constexpr i64 PORT_HIDDEN = 1;
+constexpr i64 PORT_PLAIN = 2;
+constexpr u64 RX_MODE_PROMISCUOUS = 1;
+constexpr u64 RX_MODE_ALL_MULTICAST = 2;
+
+Outcome LoadLinks(LinuxHost *host) {
+    Outcome outcome = NetlinkOpen(&host->route, NETLINK_ROUTE);
+    if (outcome == FINE) {
+        outcome = LinksLoad(&host->route, &host->links);
+    }
+    if (outcome != FINE) {
+        TellOnce(&host->toldNetlink, "corekit: the kernel does not tell its network interfaces: %s\n",
+                 StatusText(StatusOf(outcome)));
+    }
+    return outcome;
+}
+
+bool Contains(const std::vector<u32> &sorted, u32 value) {
+    return std::binary_search(sorted.begin(), sorted.end(), value);
+}
+
+bool StandsOnSwitch(const Link &link) {
+    return (link.kind == KIND_MACVLAN || link.kind == KIND_MACVTAP) && link.lower != 0;
+}
+
+bool IsSwitch(const Link &link) {
+    return link.kind == KIND_BRIDGE || (link.kind == KIND_SWITCH && link.master == 0);
+}
+
+u32 SwitchAbove(const LinuxHost &host, const Link &link, int depth) {
+    const Link *master = link.master != 0 ? LinksFind(host.links, link.master) : nullptr;
+    if (master != nullptr) {  // a member of a bond is where its bond is
+        return IsSwitch(*master) ? master->index : depth > 0 ? SwitchAbove(host, *master, depth - 1) : 0;
+    }
+    if (IsSwitch(link) || Contains(host.lowers, link.index)) {
+        return link.index;
+    }
+    return StandsOnSwitch(link) && LinksFind(host.links, link.lower) != nullptr ? link.lower : 0;
+}
+
+void FindLowers(LinuxHost *host) {
+    host->lowers.clear();
+    for (const Link &link : host->links.rows) {
+        if (!link.gone && StandsOnSwitch(link)) {
+            host->lowers.push_back(link.lower);
+        }
+    }
+    std::sort(host->lowers.begin(), host->lowers.end());
+}
+
+void AddSwitch(LinuxHost *host, u32 index, const char *name) {
+    SwitchEntry entry = {index, {}};
+    memcpy(entry.name, name, std::min(strlen(name), sizeof entry.name - 1));
+    host->switches.push_back(entry);
+}
+
+// Switches in the order of their devices, then the one that stands for none.
+void FindSwitches(LinuxHost *host) {
+    host->switches.clear();
+    host->members.clear();
+    for (const Link &link : host->links.rows) {
+        if (link.gone) {
+            continue;
+        }
+        host->members.push_back({HostSwitchOf(*host, link), link.index});
+        if (IsSwitch(link) || (Contains(host->lowers, link.index) && link.master == 0)) {
+            AddSwitch(host, link.index, link.name);
+        }
+    }
+    std::sort(host->members.begin(), host->members.end(), [](const Member &left, const Member &right) {
+        return left.switchIndex != right.switchIndex ? left.switchIndex < right.switchIndex : left.index < right.index;
+    });
+    if (!host->members.empty() && host->members.front().switchIndex == 0) {
+        AddSwitch(host, 0, NO_SWITCH);
+    }
+}
+
+// What hangs on more than a link's own row, brought up to the present table.
+void JoinLinks(LinuxHost *host) {
+    if (host->linkChange != host->links.change) {
+        host->linkChange = host->links.change;
+        host->change++;
+        FindLowers(host);
+        FindSwitches(host);
+    }
+}
+
+bool Addressed(LinuxHost *host, u32 index) {
+    if (!host->addressed) {
+        host->addressed = true;
+        host->addresses.clear();
+        AddressesLoad(&host->route, &host->addresses);
+    }
+    return Contains(host->addresses, index);
+}
+
+bool IsNic(const LinuxHost &host, const Link &link) {
+    const Link *lower = link.kind == KIND_VLAN ? LinksFind(host.links, link.lower) : nullptr;
+    return link.device[0] != 0 || (lower != nullptr && lower->device[0] != 0);
+}
+
+const HeldTap *Holder(LinuxHost *host, const Link &link) {
+    if ((link.kind != KIND_TAP && link.kind != KIND_MACVTAP) || HostScan(host) != FINE) {
+        return nullptr;
+    }
+    return GuestsFind(host->guests, link.name, link.index);
+}
+
+i64 TypeOf(LinuxHost *host, const Link &link, const HeldTap *tap) {
+    if ((link.flags & IFF_LOOPBACK) != 0) {
+        return PORT_HIDDEN;
+    }
+    if (tap != nullptr) {
+        return PORT_VNIC;
+    }
+    if (link.kind == KIND_BRIDGE || link.kind == KIND_SWITCH) {
+        return Addressed(host, link.index) ? PORT_HOST_STACK : PORT_PLAIN;
+    }
+    return IsNic(*host, link) ? PORT_UPLINK : PORT_PLAIN;
+}
+
+const char *SwitchName(const LinuxHost &host, u32 index) {
+    const Link *link = index != 0 ? LinksFind(host.links, index) : nullptr;
+    return link != nullptr ? link->name : NO_SWITCH;
+}
+
+const Link *LinkOf(LinuxHost *host, int64_t index) {
+    return index > 0 && index <= UINT32_MAX ? LinksFind(host->links, static_cast<u32>(index)) : nullptr;
+}
+
+const u8 *GuestMac(LinuxHost *host, const Link &link, const HeldTap &tap) {
+    if (link.kind == KIND_MACVTAP) {
+        return link.mac;
+    }
+    if (tap.macTold) {
+        return tap.mac;
+    }
+    if (!host->neighboured) {
+        host->neighboured = true;
+        host->learned.clear();
+        LearnedLoad(&host->route, &host->learned);
+    }
+    const Learned *learned = LearnedFind(host->learned, link.index);
+    return learned != nullptr ? learned->mac : tap.mac;
+}
+
+void PutMac(char *record, FieldLayout field, const u8 *mac) {
+    memcpy(record + field.offset, mac, field.width);
+}
+
+// The world leader of a guest whose vcpus can be told; without them the caller would only find out that there are none.
+u32 LeaderOf(const Guest &guest) {
+    return guest.vcpus.empty() ? 0 : guest.pid;
+}
+
+void PutGuest(LinuxHost *host, const Link &link, const HeldTap &tap, char *record) {
+    const Guest &guest = host->guests.guests[tap.guest];
+    PutText(record, port_status::CLIENT_NAME, guest.name.empty() ? link.name : guest.name.c_str());
+    Put(record, port_status::WORLD_LEADER, LeaderOf(guest));
+    PutMac(record, port_status::VNIC_MAC, GuestMac(host, link, tap));
+}
+
+bool WasShown(const LinuxHost &host, const std::string &name) {
+    return std::find(host.shown.begin(), host.shown.end(), name) != host.shown.end();
+}
+
+void Show(LinuxHost *host, const char *name) {
+    if (!WasShown(*host, name)) {
+        host->shown.emplace_back(name);
+    }
+}
+
+}  // namespace
+
+Outcome HostLinks(LinuxHost *host) {
+    u64 now = host->now();
+    if (host->loaded && now - host->lookedAt < NOTICE_LOOK) {
+        return FINE;
+    }
+    host->lookedAt = now;
+    Outcome outcome = FINE;
+    if (!host->loaded) {
+        // Without notices the table stays as it is until the next list; what is gone is told by its counters.
+        NetlinkOpen(&host->notices, NETLINK_ROUTE, LINK_NOTICES);
+        outcome = LoadLinks(host);
+        host->loaded = outcome == FINE;
+    } else if (host->notices.fd < 0 || LinksNotices(&host->notices, &host->links) == INTERRUPTED) {
+        outcome = LoadLinks(host);
+    }
+    JoinLinks(host);
+    return outcome;
+}
+
+void HostForget(LinuxHost *host) {
+    host->scanned = false;
+    host->addressed = false;
+    host->neighboured = false;
+    host->lookedAt = 0;
+    host->change++;
+}
+
+Outcome HostScan(LinuxHost *host) {
+    if (!host->scanned) {
+        host->scanned = true;
+        host->change++;
+        return GuestsScan(host->root, &host->guests);
+    }
+    return FINE;
+}
+
+u32 HostSwitchOf(const LinuxHost &host, const Link &link) {
+    return SwitchAbove(host, link, DEPTH);
+}
+
+Port *HostJoin(LinuxHost *host, const Link &link) {
+    Port *port = &host->ports[link.index];
+    if (port->joined != host->change) {
+        port->tap = Holder(host, link);
+        port->type = TypeOf(host, link, port->tap);
+        port->joined = host->change;
+    }
+    return port;
+}
+
+const Link *HostPort(LinuxHost *host, const Params &keys) {
+    if (HostLinks(host) != FINE) {
+        return nullptr;
+    }
+    const Link *link = LinkOf(host, keys[1].number);
+    auto found = link != nullptr ? host->ports.find(link->index) : host->ports.end();
+    if (found == host->ports.end() || found->second.birth != link->birth) {
+        return nullptr;
+    }
+    const Port &port = found->second;
+    bool stayed = HostSwitchOf(*host, *link) == port.switchIndex;
+    const char *name = keys[0].text.c_str();
+    return stayed && strcmp(name, port.switchName) == 0 ? link : nullptr;
+}
+
+KnfStatus PortTypeGet(LinuxHost *host, const Params &keys, char *record) {
+    Outcome outcome = HostLinks(host);
+    const Link *link = outcome == FINE ? LinkOf(host, keys[0].number) : nullptr;
+    if (link == nullptr) {
+        return outcome == FINE ? STATUS_NOT_FOUND : StatusOf(outcome);
+    }
+    Port *port = HostJoin(host, *link);
+    port->birth = link->birth;
+    port->switchIndex = HostSwitchOf(*host, *link);
+    memset(port->switchName, 0, sizeof port->switchName);
+    const char *name = SwitchName(*host, port->switchIndex);
+    memcpy(port->switchName, name, std::min(strlen(name), sizeof port->switchName - 1));
+    Put(record, port_type::TYPE, static_cast<u64>(port->type));
+    PutText(record, port_type::SWITCH_NAME, port->switchName);
+    return STATUS_OK;
+}
+
+KnfStatus PortStatusGet(LinuxHost *host, const Params &keys, char *record) {
+    const Link *link = HostPort(host, keys);
+    if (link == nullptr) {
+        return STATUS_NOT_FOUND;
+    }
+    const Port &port = *HostJoin(host, *link);
+    if (port.tap != nullptr) {
+        PutGuest(host, *link, *port.tap, record);
+    } else {
+        PutText(record, port_status::CLIENT_NAME, link->name);
+        PutMac(record, port_status::MAC, link->mac);
+    }
+    Put(record, port_status::FLAGS, port.type == PORT_UPLINK ? static_cast<u64>(PORT_FLAG_UPLINK) : 0);
+    Put(record, port_status::RX_MODE,
+        ((link->flags & IFF_PROMISC) != 0 ? RX_MODE_PROMISCUOUS : 0) |
+            ((link->flags & IFF_ALLMULTI) != 0 ? RX_MODE_ALL_MULTICAST : 0));
+    return STATUS_OK;
+}
+
+KnfStatus SwitchList(LinuxHost *host, const Params & /*keys*/, Params *entries) {
+    HostForget(host);
+    if (Outcome outcome = HostLinks(host); outcome != FINE) {
+        return StatusOf(outcome);
+    }
+    for (const SwitchEntry &entry : host->switches) {
+        Show(host, entry.name);
+        entries->push_back(ParamOf(std::string(entry.name)));
+    }
+    return STATUS_OK;
+}
+
+KnfStatus SwitchPorts(LinuxHost *host, const Params &keys, Params *entries) {
+    if (Outcome outcome = HostLinks(host); outcome != FINE) {
+        return StatusOf(outcome);
+    }
+    auto entry = std::find_if(host->switches.begin(), host->switches.end(),
+                              [&](const SwitchEntry &one) { return keys[0].text == one.name; });
+    if (entry == host->switches.end()) {
+        return WasShown(*host, keys[0].text) ? STATUS_OK : STATUS_NOT_FOUND;
+    }
+    Show(host, entry->name);
+    auto member = std::lower_bound(host->members.begin(), host->members.end(), entry->index,
+                                   [](const Member &one, u32 index) { return one.switchIndex < index; });
+    for (; member != host->members.end() && member->switchIndex == entry->index; ++member) {
+        entries->push_back(ParamOf(int64_t{member->index}));
+    }
+    return STATUS_OK;
+}

@@ -1,0 +1,200 @@
+#include "corekit/linuxhost/host.h"
+#include "corekit/linuxhost/host_nodes.h"
+
+#include <algorithm>
+#include <unistd.h>
+
+namespace {
+
+// Which node of a thread is read: each is an instance of its own.
+enum ThreadNode : u8 { THREAD_STATES, THREAD_EVENTS, THREAD_MOVES, THREAD_CACHE_MOVES };
+
+constexpr u64 NANOSECONDS = 1000;  // of a microsecond
+constexpr u32 NO_WORLDLET = 0xffffffff;
+
+Threads *OpenThreads(LinuxHost *host) {
+    if (!host->threadsOpen) {
+        host->threadsOpen = ThreadsOpen(&host->threads, &host->root, HostTopology(host), true) == FINE;
+    }
+    return host->threadsOpen ? &host->threads : nullptr;
+}
+
+bool IsSelf(int64_t id) {
+    return id == getpid();
+}
+
+Outcome Watch(LinuxHost *host, u32 pid, u32 tid, u32 wanted) {
+    Threads *threads = OpenThreads(host);
+    return threads != nullptr ? ThreadWatch(threads, pid, tid, wanted) : UNSUPPORTED;
+}
+
+Outcome ReadThread(LinuxHost *host, u32 tid, ThreadNode node, const ThreadRow **row) {
+    Threads *threads = OpenThreads(host);
+    if (threads == nullptr) {
+        return UNSUPPORTED;
+    }
+    ThreadUse &use = host->uses[tid];
+    PassJoin(&use.pass, &use.served[node], host->now());
+    return ThreadRead(threads, tid, use.pass.generation, row);
+}
+
+bool IsThread(int64_t id) {
+    return id > 0 && id <= INT32_MAX;
+}
+
+// A vcpu by its id, or the calling process, of which only the migrations are those of a thread.
+Outcome ReadVcpu(LinuxHost *host, int64_t id, ThreadNode node, const ThreadRow **row) {
+    if (!IsThread(id)) {
+        return GONE;
+    }
+    auto tid = static_cast<u32>(id);
+    if (IsSelf(id) && host->uses.find(tid) == host->uses.end()) {
+        Outcome outcome = Watch(host, tid, tid, THREAD_MIGRATIONS);
+        if (outcome != FINE) {
+            return outcome;
+        }
+    }
+    return ReadThread(host, tid, node, row);
+}
+
+// The guest behind an id that stands for it; null unless its vcpus can be told.
+const Guest *GuestOf(LinuxHost *host, int64_t id) {
+    if (HostScan(host) != FINE) {
+        return nullptr;
+    }
+    const std::vector<Guest> &guests = host->guests.guests;
+    auto at = std::lower_bound(guests.begin(), guests.end(), id,
+                               [](const Guest &guest, int64_t pid) { return guest.pid < pid; });
+    return at != guests.end() && at->pid == id && !at->vcpus.empty() ? &*at : nullptr;
+}
+
+// Leader, cartel and group of a guest are all its process.
+KnfStatus ChainGet(LinuxHost *host, const Params &keys, FieldLayout field, char *record) {
+    const Guest *guest = GuestOf(host, keys[0].number);
+    if (guest == nullptr) {
+        return STATUS_NOT_FOUND;
+    }
+    Put(record, field, guest->pid);
+    return STATUS_OK;
+}
+
+void AddWorker(LinuxHost *host, const std::string &name, const WorkerThread &thread, Params *entries) {
+    if (host->workers.insert_or_assign(name, thread).second) {
+        entries->push_back(ParamOf(name));
+    }
+}
+
+}  // namespace
+
+KnfStatus CartelGet(LinuxHost *host, const Params &keys, char *record) {
+    return ChainGet(host, keys, vcpu_chain::CARTEL, record);
+}
+
+KnfStatus GroupGet(LinuxHost *host, const Params &keys, char *record) {
+    return ChainGet(host, keys, vcpu_chain::GROUP, record);
+}
+
+KnfStatus LeaderGet(LinuxHost *host, const Params &keys, char *record) {
+    return ChainGet(host, keys, vcpu_chain::LEADER, record);
+}
+
+KnfStatus VcpuList(LinuxHost *host, const Params &keys, Params *entries) {
+    const Guest *guest = GuestOf(host, keys[0].number);
+    if (guest == nullptr) {
+        return STATUS_NOT_FOUND;
+    }
+    for (u32 tid : guest->vcpus) {
+        if (Outcome outcome = Watch(host, guest->pid, tid, THREAD_TIMES | THREAD_MIGRATIONS); outcome != FINE) {
+            return StatusOf(outcome);
+        }
+        entries->push_back(ParamOf(int64_t{tid}));
+    }
+    return STATUS_OK;
+}
+
+KnfStatus VcpuTimesGet(LinuxHost *host, const Params &keys, char *record) {
+    if (IsSelf(keys[0].number)) {
+        SelfRow self = SelfRead();
+        Put(record, vcpu_times::ELAPSED, self.elapsed / NANOSECONDS);
+        Put(record, vcpu_times::USED, self.run / NANOSECONDS);
+        return STATUS_OK;
+    }
+    const ThreadRow *row = nullptr;
+    Outcome outcome = ReadVcpu(host, keys[0].number, THREAD_STATES, &row);
+    if (outcome == FINE && (row->known & THREAD_TIMES) == 0) {
+        outcome = UNSUPPORTED;
+    }
+    if (outcome == FINE) {
+        Put(record, vcpu_times::ELAPSED, row->life / NANOSECONDS);
+        Put(record, vcpu_times::USED, row->run / NANOSECONDS);
+        Put(record, vcpu_times::READY, row->ready / NANOSECONDS);
+    }
+    return StatusOf(outcome);
+}
+
+// Nothing here counts what the record holds; it is served so that the times and migrations beside it are.
+KnfStatus VcpuEventsGet(LinuxHost *host, const Params &keys, char * /*record*/) {
+    const ThreadRow *row = nullptr;
+    return StatusOf(ReadVcpu(host, keys[0].number, THREAD_EVENTS, &row));
+}
+
+KnfStatus VcpuMigrationsGet(LinuxHost *host, const Params &keys, char *record) {
+    const ThreadRow *row = nullptr;
+    Outcome outcome = ReadVcpu(host, keys[0].number, THREAD_MOVES, &row);
+    if (outcome == FINE) {
+        Put(record, vcpu_migrations::COUNT, (row->known & THREAD_MIGRATIONS) != 0 ? row->migrations : 0);
+    }
+    return StatusOf(outcome);
+}
+
+// True where there is one last-level cache, or the thread may not leave its own; elsewhere nobody counts.
+KnfStatus VcpuCacheMigrationsGet(LinuxHost *host, const Params &keys, char * /*record*/) {
+    const ThreadRow *row = nullptr;
+    return keys[1].text == "L3" ? StatusOf(ReadVcpu(host, keys[0].number, THREAD_CACHE_MOVES, &row)) : STATUS_NOT_FOUND;
+}
+
+KnfStatus WorldletList(LinuxHost *host, const Params & /*keys*/, Params *entries) {
+    if (Outcome outcome = HostScan(host); outcome != FINE) {
+        return StatusOf(outcome);
+    }
+    host->workers.clear();
+    for (const Guest &guest : host->guests.guests) {
+        for (const WorkerThread &thread : guest.vhost) {
+            std::string owner = std::to_string(guest.pid);
+            AddWorker(host, "NetWdt-Async-" + owner + "-vhost-" + std::to_string(thread.tid), thread, entries);
+        }
+    }
+    for (const WorkerThread &thread : host->guests.nics) {
+        AddWorker(host, thread.name, thread, entries);
+    }
+    return STATUS_OK;
+}
+
+KnfStatus WorldletGet(LinuxHost *host, const Params &keys, char *record) {
+    using namespace worldlet_stats;
+    auto found = host->workers.find(keys[0].text);
+    if (found == host->workers.end()) {
+        return STATUS_NOT_FOUND;
+    }
+    const WorkerThread &worker = found->second;
+    if (host->uses.find(worker.tid) == host->uses.end()) {
+        Watch(host, worker.pid, worker.tid, THREAD_TIMES | THREAD_MIGRATIONS | THREAD_REMOTE_WAKEUPS | THREAD_AFFINITY);
+    }
+    const ThreadRow *row = nullptr;
+    Outcome outcome = ReadThread(host, worker.tid, THREAD_STATES, &row);
+    if (outcome == FINE && (row->known & THREAD_TIMES) == 0) {
+        outcome = UNSUPPORTED;
+    }
+    if (outcome != FINE) {
+        return StatusOf(outcome);
+    }
+    Put(record, AFFINE_PCPU, (row->known & THREAD_AFFINITY) != 0 ? row->affinity : NO_CPU);
+    Put(record, AFFINE_WORLDLET, NO_WORLDLET);
+    Put(record, RUNS, row->runs);
+    Put(record, MIGRATIONS, (row->known & THREAD_MIGRATIONS) != 0 ? row->migrations : 0);
+    Put(record, REMOTE_ACTS, (row->known & THREAD_REMOTE_WAKEUPS) != 0 ? row->remoteWakeups : 0);
+    Put(record, USED, row->run);
+    Put(record, READY, row->ready);
+    Put(record, WAIT, row->life - std::min(row->life, row->run + row->ready));
+    return STATUS_OK;
+}
