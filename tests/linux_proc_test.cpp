@@ -61,7 +61,7 @@ TEST_F(Tree, CpusThatAreOffStandStillAndComeBackWithoutAStep) {
     ASSERT_EQ(CpusOpen(&cpus, root), FINE);
     const CpuTopology &topology = cpus.topology;
     EXPECT_EQ(std::tuple(topology.cpus, topology.packages, topology.lastCacheSharers), std::tuple(4, 2, 2));
-    EXPECT_EQ(CpuListCache(topology, "0-3"), 3U) << "what is off has no cache";
+    EXPECT_EQ(topology.lastCache, (std::vector<u32>{NO_CPU, 3, NO_CPU, 3}));
     CpusRead(&cpus, 1);
     const CpuRow *row = cpus.rows.data();
     EXPECT_EQ(std::tuple(row->busy, row->interrupts, row->elapsed), std::tuple(1980000, 670000, 46980000));
@@ -103,7 +103,7 @@ TEST_F(Tree, NamesOfThreadsPassForNoFigure) {
         ProcLimitKept(kept);
         Threads threads;
         const ThreadRow *row = nullptr;
-        ThreadsOpen(&threads, &root, nullptr, false);
+        ThreadsOpen(&threads, &root, false);
         ASSERT_EQ(ThreadWatch(&threads, 7, 8, 15), FINE);
         ASSERT_EQ(ThreadRead(&threads, 8, 1, &row), FINE);
         EXPECT_EQ(std::tuple(row->known, row->run, row->ready, row->runs), std::tuple(15, 5000000, 600, 70));
@@ -124,7 +124,7 @@ TEST(Threads, AThreadOfOursRunsAsItsClockSaysAndIsGoneWhenItEnded) {
     u32 tid = 0;
     i64 difference = 1000000000;
     ProcRootOpen(&root);
-    ThreadsOpen(&threads, &root, nullptr, true);
+    ThreadsOpen(&threads, &root, true);
     std::thread([&] {
         tid = static_cast<u32>(gettid());
         ASSERT_EQ(ThreadWatch(&threads, static_cast<u32>(getpid()), tid, THREAD_TIMES | THREAD_MIGRATIONS), FINE);

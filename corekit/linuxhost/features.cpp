@@ -76,7 +76,9 @@ Answer AskTapHolders(const ProcRoot &root) {
 Answer AskSchedstat(const ProcRoot &root) {
     Text file(root, "thread-self/schedstat");
     bool counted = file.text.find_first_of("123456789") != std::string_view::npos;
-    return file.outcome == FINE && !counted ? ANSWER_NO : OfOutcome(file.outcome);
+    return AskProcesses(root) == ANSWER_NO    ? ANSWER_CANT_TELL
+           : file.outcome == FINE && !counted ? ANSWER_NO
+                                              : OfOutcome(file.outcome);
 }
 
 Answer AskPerf(const ProcRoot &) {

@@ -14,7 +14,7 @@ constexpr u32 NO_WORLDLET = 0xffffffff;
 
 Threads *OpenThreads(LinuxHost *host) {
     if (!host->threadsOpen) {
-        host->threadsOpen = ThreadsOpen(&host->threads, &host->root, HostTopology(host), true) == FINE;
+        host->threadsOpen = ThreadsOpen(&host->threads, &host->root, true) == FINE;
     }
     return host->threadsOpen ? &host->threads : nullptr;
 }

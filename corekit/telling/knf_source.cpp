@@ -26,10 +26,13 @@ std::string Quoted(const std::string &name) {
     return text;
 }
 
-void PrintHost() {
+void PrintHost(const ProcRoot &root) {
     utsname names = {};
     uname(&names);
     printf("Linux %s on %s, user %u\n", names.release, names.machine, geteuid());
+    if (FeatureAsk(root, FEATURE_PROCESSES) == ANSWER_NO) {
+        printf("There is no /proc: no report can be made.\n");
+    }
 }
 
 void PrintFeatures(const ProcRoot &root) {
@@ -75,9 +78,14 @@ void PrintGuests(const ProcRoot &root) {
     }
 }
 
+// Who may not look at others' processes still sees the guests of his own.
+bool OwnAlone(const ProcRoot &root, const KeyRow &row) {
+    return row.need == FEATURE_TAP_HOLDERS && FeatureAsk(root, row.need) == ANSWER_NOT_ALLOWED;
+}
+
 bool Lacks(const ProcRoot &root, const KeyRow &row) {
     Answer answer = row.need != FEATURES ? FeatureAsk(root, row.need) : ANSWER_YES;
-    return answer == ANSWER_NO || answer == ANSWER_NOT_ALLOWED;
+    return (answer == ANSWER_NO || answer == ANSWER_NOT_ALLOWED) && !OwnAlone(root, row);
 }
 
 Worth WorthHere(const ProcRoot &root, const KeyRow &row) {
@@ -90,6 +98,9 @@ std::string TextHere(const ProcRoot &root, const KeyRow &row) {
         return row.how;
     }
     const Feature &feature = FeatureOf(row.need);
+    if (OwnAlone(root, row)) {
+        return std::string(row.how) + " (guests of this user alone; those of others need " + feature.cure + ")";
+    }
     std::string text = std::string(feature.name) + ": " + AnswerText(FeatureAsk(root, row.need));
     return Lacks(root, row) ? text + "; needs " + feature.cure : std::string(row.how) + " (" + text + ")";
 }
@@ -185,7 +196,7 @@ int main(int argc, char **argv) {
     } else {
         ProcRoot root;
         ProcRootOpen(&root);
-        PrintHost();
+        PrintHost(root);
         PrintFeatures(root);
         PrintGuests(root);
         PrintKeys(root);

@@ -232,17 +232,6 @@ void CpusClose(Cpus *cpus) {
     *cpus = Cpus();
 }
 
-u32 CpuListCache(const CpuTopology &topology, std::string_view list) {
-    u32 cache = NO_CPU;
-    bool one = true;
-    bool valid = EachOfList(list, [&](u32 cpu) {
-        u32 its = cpu < topology.lastCache.size() ? topology.lastCache[cpu] : NO_CPU;
-        one = one && (its == NO_CPU || cache == NO_CPU || cache == its);
-        cache = its != NO_CPU ? its : cache;
-    });
-    return valid && one ? cache : NO_CPU;
-}
-
 u32 CpuListOnly(std::string_view list) {
     u32 count = 0;
     u32 only = NO_CPU;

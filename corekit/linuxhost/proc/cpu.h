@@ -40,7 +40,5 @@ Outcome CpusOpen(Cpus *cpus, const ProcRoot &root);
 Outcome CpusRead(Cpus *cpus, u64 generation);
 void CpusClose(Cpus *cpus);
 
-// Of a list as the kernel writes it, "0-3,8": the CPU that the last-level cache of all of them is known by, and the
-// only CPU in it. NO_CPU when there is none.
-u32 CpuListCache(const CpuTopology &topology, std::string_view list);
+// The only CPU of a list as the kernel writes it, "0-3,8"; NO_CPU when there is none, or several.
 u32 CpuListOnly(std::string_view list);

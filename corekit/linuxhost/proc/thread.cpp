@@ -108,11 +108,9 @@ void ReadAffinity(Threads *threads, Thread *thread, u64 now) {
     std::string_view text;
     std::string_view list;
     thread->row.affinity = NO_CPU;
-    thread->row.cache = NO_CPU;
     if (ProcReadOnce(threads->root->proc, thread->directory + "status", LIMIT, &threads->buffer, &text) == FINE &&
         ProcFindKey(text, "Cpus_allowed_list", &list)) {
         thread->row.affinity = CpuListOnly(list);
-        thread->row.cache = threads->topology != nullptr ? CpuListCache(*threads->topology, list) : NO_CPU;
         thread->row.known |= THREAD_AFFINITY;
     }
     thread->affinityAge = now;
@@ -175,9 +173,8 @@ Outcome ReadRow(Threads *threads, Thread *thread) {
 
 }  // namespace
 
-Outcome ThreadsOpen(Threads *threads, const ProcRoot *root, const CpuTopology *topology, bool allowPerf) {
+Outcome ThreadsOpen(Threads *threads, const ProcRoot *root, bool allowPerf) {
     threads->root = root;
-    threads->topology = topology;
     threads->allowPerf = allowPerf;
     std::string_view text;
     threads->schedstats =

@@ -18,7 +18,6 @@ enum ThreadFigure : u32 {
 struct ThreadRow {
     u32 known;          // bits of ThreadFigure
     u32 affinity;       // the one CPU that it may run on; NO_CPU when there are several
-    u32 cache;          // its CPUs lie in one last-level cache: the lowest CPU of it; else NO_CPU
     u64 run;            // ns; up to a tick old while it runs
     u64 ready;          // ns in a run queue
     u64 runs;           // times that it got a CPU
@@ -26,8 +25,6 @@ struct ThreadRow {
     u64 migrations;     // since an unknown moment: only differences count
     u64 remoteWakeups;  // by another CPU
 };
-
-struct CpuTopology;
 
 // A watched thread, for thread.cpp alone.
 struct Thread {
@@ -47,15 +44,14 @@ struct Thread {
 
 struct Threads {
     const ProcRoot *root = nullptr;
-    const CpuTopology *topology = nullptr;  // for `cache`; may be null
     bool allowPerf = true;
     bool schedstats = false;               // kernel.sched_schedstats
     std::unordered_map<u64, Thread> open;  // by TID
     ProcBuffer buffer;
 };
 
-// root and topology must outlive the threads.
-Outcome ThreadsOpen(Threads *threads, const ProcRoot *root, const CpuTopology *topology, bool allowPerf);
+// The root must outlive the threads.
+Outcome ThreadsOpen(Threads *threads, const ProcRoot *root, bool allowPerf);
 // Begins to watch a thread of a process. Again for the same one: adds to what is wanted. GONE when it is no thread of
 // that process; a thread whose file for a wanted figure is missing is FINE, its rows then don't know that figure.
 Outcome ThreadWatch(Threads *threads, u32 pid, u32 tid, u32 wanted);
