@@ -194,7 +194,7 @@ Outcome HostLinks(LinuxHost *host) {
         NetlinkOpen(&host->notices, NETLINK_ROUTE, LINK_NOTICES);
         outcome = LoadLinks(host);
         host->loaded = outcome == FINE;
-    } else if (host->notices.fd < 0 || LinksNotices(&host->notices, &host->links) == INTERRUPTED) {
+    } else if (host->notices.io.receive == nullptr || LinksNotices(&host->notices, &host->links) == INTERRUPTED) {
         outcome = LoadLinks(host);
     }
     JoinLinks(host);

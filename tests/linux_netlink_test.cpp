@@ -1,0 +1,203 @@
+// What a kernel says by netlink, played from messages that are put together here.
+#include "corekit/linuxhost/host.h"
+#include "corekit/linuxhost/netlink/attributes.h"
+#include "corekit/linuxhost/source.h"
+
+#include <algorithm>
+#include <array>
+#include <deque>
+#include <gtest/gtest.h>
+#include <linux/if_link.h>
+#include <linux/rtnetlink.h>
+
+namespace {
+
+using Strings = std::vector<std::string>;
+
+template <typename Value>
+std::string Bytes(Value value) {
+    return {reinterpret_cast<const char *>(&value), sizeof value};
+}
+std::string Padded(const std::string &text) {
+    return text + std::string((4 - text.size() % 4) % 4, '\0');
+}
+std::string Attr(u16 type, const std::string &payload, u32 more = 0) {
+    return Padded(Bytes(nlattr{static_cast<u16>(4 + payload.size() + more), type}) + payload);
+}
+std::string Message(u16 type, const std::string &payload, u16 flags = 0) {
+    return Padded(Bytes(nlmsghdr{static_cast<u32>(16 + payload.size()), type, flags, 0, 0}) + payload);
+}
+std::string Done(int error = 0) {
+    return Message(NLMSG_DONE, Bytes(error));
+}
+std::string Told(int index, const char *name, const char *kind, u32 master = 0, u16 type = RTM_NEWLINK, u16 flags = 0) {
+    ifinfomsg header = {};
+    header.ifi_index = index;
+    std::string mac = std::string("\2\0\0\0\0", 5) + static_cast<char>(index);
+    return Message(type,
+                   Bytes(header) + Attr(IFLA_IFNAME, name) + Attr(0x3ff0, "newer than we are") +
+                       Attr(IFLA_MTU, Bytes(1500)) + Attr(IFLA_MASTER, Bytes(master)) + Attr(IFLA_ADDRESS, mac) +
+                       Attr(IFLA_LINKINFO, Attr(IFLA_INFO_KIND, kind)),
+                   flags);
+}
+std::string Counted(u32 index, u64 unit) {
+    std::array<u64, 8> stats = {1 * unit, 2 * unit, 3 * unit, 4 * unit, 5 * unit, 6 * unit, 7 * unit, 8 * unit};
+    return Message(RTM_NEWSTATS, Bytes(if_stats_msg{0, 0, 0, index, 0}) + Attr(IFLA_STATS_LINK_64, Bytes(stats)));
+}
+
+// Answers each request by the next entry: datagrams, of which an empty one stands for some that were lost.
+struct Kernel {
+    std::deque<Strings> answers;
+    std::deque<std::string> waiting;
+    u32 sequence = 0;
+
+    static ssize_t Send(void *context, const void *message, size_t size) {
+        auto *kernel = static_cast<Kernel *>(context);
+        if (kernel->answers.empty()) {
+            ADD_FAILURE() << "an unexpected request";
+            return -1;
+        }
+        kernel->waiting.insert(kernel->waiting.end(), kernel->answers[0].begin(), kernel->answers[0].end());
+        kernel->answers.pop_front();
+        memcpy(&kernel->sequence, static_cast<const char *>(message) + 8, 4);
+        return static_cast<ssize_t>(size);
+    }
+    static ssize_t Receive(void *context, void *buffer, size_t) {
+        auto *kernel = static_cast<Kernel *>(context);
+        errno = EAGAIN;
+        if (kernel->waiting.empty()) {
+            return -1;
+        }
+        errno = ENOBUFS;
+        std::string text = kernel->waiting[0];
+        kernel->waiting.pop_front();
+        for (u32 at = 0, length = 0; at + 16 <= text.size(); at += (std::max(length, 16U) + 3) & ~3U) {
+            memcpy(&length, &text[at], 4);
+            memcpy(&text[at + 8], &kernel->sequence, 4);
+        }
+        memcpy(buffer, text.data(), text.size());
+        return text.empty() ? -1 : static_cast<ssize_t>(text.size());
+    }
+};
+
+struct Machine {
+    inline static u64 clock = 1;
+    Kernel route, notices;
+    LinuxHost *host = LinuxHostOpen();
+    Machine(const std::string &links, const std::vector<int> &ports) {
+        host->now = [] { return clock; };
+        host->route.io = {Kernel::Send, Kernel::Receive, &route};
+        host->notices.io = {Kernel::Send, Kernel::Receive, &notices};
+        route.answers = {{links, Done()}};
+        for (int port : ports) {
+            EXPECT_EQ(Get(NODE_PORT_TYPE, {ParamOf(port)}), STATUS_OK);
+        }
+    }
+    Machine(const Machine &) = delete;
+    ~Machine() { LinuxHostClose(host); }
+    KnfStatus Get(u32 node, const Params &keys, std::string *record = nullptr) {
+        std::string bytes(NodeRecordSize(node), '?');
+        u32 size = NodeRecordSize(node);
+        KnfStatus status = LinuxHostSource(host).get(host, node, keys, bytes.data(), size);
+        return record != nullptr ? record->swap(bytes), status : status;
+    }
+};
+
+}  // namespace
+
+// clang-format off
+TEST(LinuxNetlink, AttributesOfAnyLengthFillNoMoreThanTheirField) {
+    struct Row {
+        u32 number = 7;
+        char name[4] = {'?', '?', '?', '?'};
+        u32 guard = 0x600d;
+    };
+    constexpr AttrField TABLE[] = {{1, ATTR_UINT, ATTR_AT(Row, number)}, {2, ATTR_TEXT, ATTR_AT(Row, name)}};
+    struct Case { std::string bytes; u32 known, number; const char *name; };
+    for (const Case &one : {Case{Attr(1, Bytes(u16{300})), 1, 300, "????"}, {Attr(1, Bytes(1LL << 32)), 0, 7, "????"},
+                            {Attr(1, "abc"), 0, 7, "????"}, {Attr(2, "toolong") + Attr(1, "x"), 3, 'x', "too"},
+                            {Attr(2, ""), 2, 7, ""}, {Attr(9, "?") + Attr(0x4001, Bytes(5)), 1, 5, "????"},
+                            {Attr(1, "1234", -8U) + Attr(1, Bytes(6)), 0, 7, "????"},       // a length of 0
+                            {Attr(1, "1234", -7U), 0, 7, "????"}, {Attr(1, "1234", 65527), 0, 7, "????"}}) {
+        for (size_t cut = 0; cut <= one.bytes.size(); cut++) {
+            Row row;
+            u32 known = AttrFill(TABLE, std::string_view(one.bytes.data(), cut), &row);
+            EXPECT_EQ(row.guard, 0x600dU);
+            if (cut == one.bytes.size()) {
+                EXPECT_EQ(known, one.known);
+                EXPECT_EQ(row.number, one.number);
+                EXPECT_EQ(std::string(row.name, strnlen(row.name, 4)), one.name);
+            }
+        }
+    }
+}
+
+TEST(LinuxNetlink, ADumpIsBelievedOnlyWhenItsEndWasSeen) {
+    std::string both = Told(2, "br0", "bridge") + Told(3, "tap0", "tun", 2);
+    Strings torn = {Told(2, "br0", "bridge", 0, RTM_NEWLINK, NLM_F_DUMP_INTR), Done()};
+    struct Case { std::deque<Strings> answers; Outcome outcome; size_t links; };
+    std::vector<Case> cases = {
+        {{{both, Done()}}, FINE, 2}, {{{both + Done(-EPERM)}}, REFUSED, 0}, {{{Done(-EINVAL)}}, BROKEN, 0},
+        {{{Message(NLMSG_ERROR, Bytes(-EOPNOTSUPP))}}, UNSUPPORTED, 0}, {{torn, {both, Done()}}, FINE, 2},
+        {{{both, "", Done()}, {both + Done()}}, FINE, 2}, {{torn, torn, torn, torn, torn}, FINE, 1}};
+    for (size_t cut = 0; cut < both.size() + 20; cut++) {
+        cases.push_back({{{(both + Done()).substr(0, cut)}}, BROKEN, 0});
+    }
+    for (const Case &one : cases) {
+        Kernel kernel{one.answers, {}};
+        NetlinkSocket socket;
+        LinkTable table;
+        socket.io = {Kernel::Send, Kernel::Receive, &kernel};
+        NetlinkOpen(&socket, 0);
+        EXPECT_EQ(LinksLoad(&socket, &table), one.outcome);
+        EXPECT_EQ(table.rows.size(), one.links);
+        EXPECT_TRUE(kernel.answers.empty() && kernel.waiting.empty());
+    }
+}
+
+TEST(LinuxNetlink, APortIsLostWhenItGoesMovesOrIsAnotherAndNotBefore) {
+    std::string bridges = Told(2, "br0", "bridge") + Told(3, "br1", "bridge");
+    std::string torn = Told(2, "br0", "bridge", 0, RTM_NEWLINK, NLM_F_DUMP_INTR);
+    std::string port = Told(7, "v0", "veth", 2), gone = Told(7, "v0", "veth", 2, RTM_DELLINK);
+    std::string error = Message(NLMSG_ERROR, Bytes(-ENODEV));
+    struct Case { const char *what; std::deque<std::string> notices; std::deque<Strings> answers; bool lost; };
+    for (const Case &one : {Case{"nothing", {}, {}, false}, {"renamed", {Told(7, "new", "veth", 2)}, {}, false},
+                            {"moved", {Told(7, "v0", "veth", 3)}, {}, true}, {"gone", {gone}, {}, true},
+                            {"index used again", {gone + port}, {}, true},
+                            {"lost notices", {""}, {{bridges + port, Done()}}, false},
+                            {"gone unseen", {""}, {{bridges, Done()}}, true},
+                            {"left out of torn dumps", {""}, {{torn, Done()}, {torn, Done()}, {torn, Done()},
+                             {torn, Done()}, {torn, Done()}, {Told(3, "br1", "bridge")}, {port}}, false},
+                            {"gone in torn dumps", {""}, {{torn, Done()}, {torn, Done()}, {torn, Done()},
+                             {torn, Done()}, {torn, Done()}, {Told(3, "br1", "bridge")}, {error}}, true}}) {
+        Machine machine(bridges + port, {7});
+        Machine::clock += NOTICE_LOOK;
+        machine.notices.waiting = one.notices;
+        machine.route.answers = one.answers;
+        KnfStatus status = machine.Get(NODE_PORT_STATUS, {ParamOf(std::string("br0")), ParamOf(7)});
+        EXPECT_EQ(status != STATUS_OK, one.lost) << one.what;
+        EXPECT_TRUE(machine.route.answers.empty()) << one.what;
+    }
+}
+
+TEST(LinuxNetlink, APassIsOneDumpAndTheNextOneIsAnother) {
+    Machine machine(Told(2, "v0", "veth") + Told(3, "v1", "veth"), {2, 3});
+    struct Step { u64 after; int port; bool dump; };  // ns
+    u64 unit = 0;
+    for (const Step &step : {Step{1, 2, true}, {1, 3, false}, {PASS_FLOOR / 2, 2, false}, {PASS_FLOOR, 2, true},
+                             {PASS_FLOOR, 3, false}, {PASS_AGE, 3, true}, {PASS_AGE - 1, 2, false}, {2, 2, true}}) {
+        Machine::clock += step.after;
+        unit += step.dump ? 1 : 0;
+        if (step.dump) {
+            machine.route.answers = {{Counted(2, unit) + Counted(3, unit) + Counted(99, 77), Done()}};
+        }
+        std::string record;
+        Params keys = {ParamOf(std::string(NO_SWITCH)), ParamOf(step.port)};
+        ASSERT_EQ(machine.Get(NODE_PORT_STATS, keys, &record), STATUS_OK);
+        u64 sent[3];  // packets, bytes, losses: what the client of a veth sent is what the veth received
+        memcpy(sent, record.data(), sizeof sent);
+        EXPECT_TRUE(sent[0] == unit && sent[1] == 3 * unit && sent[2] == 12 * unit) << step.after;
+        EXPECT_TRUE(machine.route.answers.empty());
+    }
+}
+// clang-format on
