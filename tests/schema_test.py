@@ -31,7 +31,8 @@ BUILT_IN = ["-A -n 2 -t " + ALL, "-A -n 2", "-A -t cChqivWVle", "-N nic0", "-N n
 
 
 def run(arguments, host=None, program="lan-meter"):
-    environment = dict(os.environ, LD_PRELOAD=BUILD / "libfixed_clock.so", ASAN_OPTIONS="verify_asan_link_order=0")
+    environment = dict(os.environ, LD_PRELOAD=BUILD / "libfixed_clock.so", ASAN_OPTIONS="verify_asan_link_order=0",
+                       COREKIT_HOST="demo")
     if host:
         pathlib.Path("host.txt").write_text(host)
         environment["COREKIT_HOST"] = "host.txt"
