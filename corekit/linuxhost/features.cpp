@@ -309,8 +309,8 @@ Answer FeatureAsk(const ProcRoot &root, FeatureId id) {
     return static_cast<Answer>(answers.known[id]);
 }
 
-void FeatureForce(FeatureId id, int answer) {
-    answers.known[id] = answer < 0 ? UNASKED : answer;
+void FeatureForce(FeatureId id, Answer answer) {
+    answers.known[id] = answer;
 }
 
 const char *AnswerText(Answer answer) {

@@ -34,6 +34,6 @@ struct Feature {
 
 const Feature &FeatureOf(FeatureId id);
 Answer FeatureAsk(const ProcRoot &root, FeatureId id);
-// From now on this is the answer; for tests of what is served without it. A negative one asks again.
-void FeatureForce(FeatureId id, int answer);
+// From now on this is the answer, whatever the kernel says.
+void FeatureForce(FeatureId id, Answer answer);
 const char *AnswerText(Answer answer);  // "yes", "no", "not allowed", "can't tell"

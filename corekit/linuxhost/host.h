@@ -121,6 +121,7 @@ struct LinuxHost {
 
     bool toldNetlink = false;  // what was said once
     bool toldQueues = false;
+    bool toldCpus = false;
 };
 
 // Writing records, which are all zeros before.

@@ -12,10 +12,12 @@
 namespace {
 
 constexpr char USAGE[] =
-    "Usage: knf-source [--page]\n"
+    "Usage: knf-source [--assume FEATURE=ANSWER]... [--page]\n"
     "Tells what this host offers to this user: the kernel's features, the guests that can be seen now, and for each\n"
     "section and key of a report whether it is exact, close, zero by nature, not measured (shown as 0) or never there.\n"
     "Nothing on the host is changed.\n"
+    "  --assume FEATURE=ANSWER  take \"yes\", \"no\", \"not allowed\" or \"can't tell\" for the kernel's answer: what another\n"
+    "                           kernel or user would get\n"
     "  --page  print the tables of all keys as Markdown, for any host\n"
     "  -h      this message\n";
 
@@ -174,33 +176,57 @@ void PrintPage() {
     }
 }
 
+// "FEATURE=ANSWER", both as they are printed. False when one of them is unknown.
+bool Assume(const std::string &text) {
+    for (u32 id = 0; id < FEATURES; id++) {
+        for (Answer answer : {ANSWER_NO, ANSWER_YES, ANSWER_NOT_ALLOWED, ANSWER_CANT_TELL}) {
+            auto feature = static_cast<FeatureId>(id);
+            if (text == std::string(FeatureOf(feature).name) + "=" + AnswerText(answer)) {
+                FeatureForce(feature, answer);
+                return true;
+            }
+        }
+    }
+    fprintf(stderr, "knf-source: %s: expected FEATURE=ANSWER as knf-source prints them\n", Quoted(text).c_str());
+    return false;
+}
+
+int Tell(bool page) {
+    if (page) {
+        PrintPage();
+        return fflush(stdout) == 0 ? 0 : 1;
+    }
+    ProcRoot root;
+    ProcRootOpen(&root);
+    PrintHost(root);
+    PrintFeatures(root);
+    PrintGuests(root);
+    PrintKeys(root);
+    ProcRootClose(&root);
+    return fflush(stdout) == 0 ? 0 : 1;
+}
+
 }  // namespace
 
 int main(int argc, char **argv) {
-    const option names[] = {
-        {"page", no_argument, nullptr, 'p'}, {"help", no_argument, nullptr, 'h'}, {nullptr, 0, nullptr, 0}};
+    const option names[] = {{"assume", required_argument, nullptr, 'a'},
+                            {"page", no_argument, nullptr, 'p'},
+                            {"help", no_argument, nullptr, 'h'},
+                            {nullptr, 0, nullptr, 0}};
     bool page = false;
     for (int letter = 0; (letter = getopt_long(argc, argv, "h", names, nullptr)) != -1;) {
-        if (letter != 'p') {
+        if (letter == 'a' && !Assume(optarg)) {
+            return 1;
+        }
+        if (letter != 'a' && letter != 'p') {
             fputs(USAGE, letter == 'h' ? stdout : stderr);
             return letter == 'h' ? 0 : 1;
         }
-        page = true;
+        page = page || letter == 'p';
     }
     if (optind != argc) {
         fputs(USAGE, stderr);
         return 1;
     }
-    if (page) {
-        PrintPage();
-    } else {
-        ProcRoot root;
-        ProcRootOpen(&root);
-        PrintHost(root);
-        PrintFeatures(root);
-        PrintGuests(root);
-        PrintKeys(root);
-        ProcRootClose(&root);
-    }
-    return fflush(stdout) == 0 ? 0 : 1;
+    return Tell(page);
 }

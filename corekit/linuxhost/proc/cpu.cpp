@@ -177,15 +177,9 @@ void TakeTimes(Cpus *cpus, u32 cpu, const u64 (&times)[8], u64 now) {
 Outcome CpusOpen(Cpus *cpus, const ProcRoot &root) {
     long ticks = sysconf(_SC_CLK_TCK);
     cpus->tick = MICROSECONDS / static_cast<u64>(ticks > 0 ? ticks : 100);
-    Outcome outcome = ProcOpen(&cpus->stat, root.proc, "stat", STAT_LIMIT);
-    if (outcome != FINE) {
-        return outcome;
-    }
     Reader reader = {root};
-    cpus->topology.cpus = std::max(CountFromSys(&reader), CountFromStat(cpus));
-    if (cpus->topology.cpus == 0) {
-        return BROKEN;
-    }
+    u32 timed = ProcOpen(&cpus->stat, root.proc, "stat", STAT_LIMIT) == FINE ? CountFromStat(cpus) : 0;
+    cpus->topology.cpus = std::max({CountFromSys(&reader), timed, 1U});
     ReadTopology(&reader, &cpus->topology);
     cpus->rows.resize(cpus->topology.cpus);
     cpus->gap.resize(cpus->topology.cpus);

@@ -34,7 +34,8 @@ struct Cpus {
     ProcBuffer buffer;
 };
 
-// Reads the topology. What /sys does not tell is taken as one CPU a core and one package.
+// Reads the topology. What /sys does not tell is taken as one CPU a core and one package, and what neither it nor
+// /proc/stat tells as one CPU. Without /proc/stat the rows fail.
 Outcome CpusOpen(Cpus *cpus, const ProcRoot &root);
 // Reads all rows, unless they are of this generation (not 0) already.
 Outcome CpusRead(Cpus *cpus, u64 generation);
