@@ -74,8 +74,12 @@ TEST_F(Tree, CpusThatAreOffStandStillAndComeBackWithoutAStep) {
     EXPECT_EQ(row->busy, 1980000U) << "the same generation";
     CpusRead(&cpus, 2);
     EXPECT_EQ(std::tuple(row->busy, row->elapsed), std::tuple(1990000, 46980000)) << "idle time went back";
-    EXPECT_LT(row[1].elapsed - off, 60000000U);
+    u64 on = row[1].elapsed;
+    EXPECT_LT(on - off, 60000000U);
     EXPECT_EQ(std::tuple(row[1].busy, row[3].busy, row[3].on), std::tuple(70000, 60000, false));
+    Put("stat", "cpu0 101 20 3 3990 500 60 7 8\ncpu1 0 0 7 101\n");
+    CpusRead(&cpus, 3);
+    EXPECT_EQ(row[1].elapsed - on, 1000000U);
     CpusClose(&cpus);
 }
 
@@ -96,13 +100,14 @@ TEST_F(Tree, CountersOfTheStackAreFoundByKey) {
 
 TEST_F(Tree, NamesOfThreadsPassForNoFigure) {
     Put("sys/kernel/sched_schedstats", "1\n");
-    Put("7/task/8/stat", "8 (a) S 1 1) R 1 1 1 0 -1 0 0 0 0 0 0 0 0 0 20 0 1 0 250 0 0\n");
+    const std::string stat = "8 (a) S 1 1) R 1 1 1 0 -1 0 0 0 0 0 0 0 0 0 20 0 1 0 ";
     Put("7/task/8/schedstat", "5000000 600 70\n");
     Put("7/task/8/status", "Name:\tCpus_allowed_list:\t1\nCpus_allowed_list:\t4\n");
     Put("7/task/8/sched", "\nnr_migrations : 3 (8, #threads: 1)\nse.nr_migrations : 4\n" + std::string(40, '-') +
                               "\nse.nr_migrations   :   41\nnr_wakeups_remote : 42\nnr_switches : 43\n");
     for (u32 kept : {9, 1, 0}) {  // the rest is opened by each read, and a thread known by its start
         ProcLimitKept(kept);
+        Put("7/task/8/stat", stat + "250 0 0\n");
         Threads threads;
         const ThreadRow *row = nullptr;
         ThreadsOpen(&threads, &root, false);
@@ -111,6 +116,8 @@ TEST_F(Tree, NamesOfThreadsPassForNoFigure) {
         EXPECT_EQ(std::tuple(row->known, row->run, row->ready, row->runs), std::tuple(15, 5000000, 600, 70));
         EXPECT_EQ(std::tuple(row->migrations, row->remoteWakeups, row->affinity), std::tuple(41, 42, 4));
         EXPECT_EQ(ThreadWatch(&threads, 7, 9, 15), GONE);
+        Put("7/task/8/stat", stat + "251 0 0\n");
+        EXPECT_EQ(ThreadRead(&threads, 8, 2, &row), kept == 0 ? GONE : FINE) << "a later thread of this number";
         ThreadsClose(&threads);
     }
     ProcBuffer buffer;
@@ -162,7 +169,7 @@ TEST_F(Tree, OnlyWhoHoldsATapIsBelieved) {
                {"CPU 1/KVM", "CPU 0/KVM", "CPU 99999999999/KVM", "CPU -1/TCG", "CPU 2/KVM ", "vhost-30", "CPU 0/KVM"});
     Guests guests;
     ASSERT_EQ(GuestsScan(root, &guests), FINE);
-    ASSERT_EQ(guests.guests.size(), 2U);
+    ASSERT_EQ(std::pair(guests.guests.size(), guests.taps.size()), std::pair(size_t{2}, size_t{3}));
     EXPECT_EQ(guests.guests[0].name, "") << "of a command line beyond the limit";
     const Guest &guest = guests.guests[1];
     EXPECT_EQ(guest.name, name);
