@@ -68,6 +68,18 @@ void Add(TcpTotals *totals, const TcpTotals &more) {
     totals->segmentsReceived += more.segmentsReceived;
 }
 
+// What a socket told before and no longer does: one that is reset begins at 0 again, and so does its last word.
+void KeepReset(TcpSockets *sockets, const std::vector<TcpSocket> &later) {
+    for (const TcpSocket &now : later) {
+        auto [begin, end] = std::equal_range(sockets->living.begin(), sockets->living.end(), now, ByCookie);
+        if (begin != end && (now.totals.bytesSent < begin->totals.bytesSent ||
+                             now.totals.bytesReceived < begin->totals.bytesReceived)) {
+            Add(&sockets->past, begin->totals);
+            begin->totals = {};
+        }
+    }
+}
+
 // The sockets of the dump, those that it no longer shows, without those whose end is told.
 void Join(TcpSockets *sockets, const std::vector<TcpSocket> &found, bool lost) {
     std::vector<TcpSocket> all(found);
@@ -111,6 +123,8 @@ Outcome TcpSocketsRead(TcpSockets *sockets, TcpTotals *totals) {
     bool lost = NetlinkNotices(&sockets->notices, {TakeSocket, &sockets->ended}) == INTERRUPTED;
     Sort(&found);
     Sort(&sockets->ended);
+    KeepReset(sockets, found);
+    KeepReset(sockets, sockets->ended);
     for (const TcpSocket &end : sockets->ended) {
         Add(&sockets->past, end.totals);
     }
