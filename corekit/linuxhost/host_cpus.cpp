@@ -50,7 +50,7 @@ KnfStatus PcpuStatsGet(LinuxHost *host, const Params &keys, char *record) {
     host->cpuServed.resize(cpus->topology.cpus);
     PassJoin(&host->cpuPass, &host->cpuServed[cpu], host->now());
     // Times that stand still show as no load at all; a failure would be told again each pass.
-    if (CpusRead(cpus, host->cpuPass.generation) != FINE) {
+    if (CpusRead(cpus, host->cpuPass.generation) != FINE && cpus->moment == 0) {
         TellOnce(&host->toldCpus, "corekit: /proc/stat does not tell the load of the CPUs\n");
         return STATUS_OK;
     }

@@ -33,7 +33,7 @@ void PrintHost(const ProcRoot &root) {
     uname(&names);
     printf("Linux %s on %s, user %u\n", names.release, names.machine, geteuid());
     if (FeatureAsk(root, FEATURE_PROCESSES) == ANSWER_NO) {
-        printf("There is no /proc: no report can be made.\n");
+        printf("There is no /proc: nothing of CPUs, guests, threads and the IP stack can be told.\n");
     }
 }
 

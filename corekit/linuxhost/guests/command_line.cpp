@@ -173,7 +173,7 @@ std::vector<CommandNic> CommandNics(std::string_view command) {
     std::vector<Backend> backends;
     std::vector<CommandNic> nics;
     EachArgument(command, "-netdev", [&](const Options &options) {
-        if (IsTap(options)) {
+        if (IsTap(options) && backends.size() < MAX_COMMAND_NICS) {
             backends.push_back(BackendOf(options));
         }
     });
@@ -189,7 +189,8 @@ std::vector<CommandNic> CommandNics(std::string_view command) {
     });
     EachArgument(command, "-nic", [&](const Options &options) {
         Backend backend = BackendOf(options);
-        if (IsTap(options) && ParseMac(ValueOf(options, "mac"), backend.nic.mac)) {
+        if (IsTap(options) && nics.size() < 2 * MAX_COMMAND_NICS &&
+            ParseMac(ValueOf(options, "mac"), backend.nic.mac)) {
             nics.push_back(backend.nic);
         }
     });

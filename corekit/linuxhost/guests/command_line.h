@@ -17,5 +17,6 @@ struct CommandNic {
 
 // Of -name NAME or -name guest=NAME; empty when there is none. `command` has its arguments ended by 0 each.
 std::string CommandGuestName(std::string_view command);
+constexpr size_t MAX_COMMAND_NICS = 1024;  // backends of a command line; further ones tell nothing
 // The cards on tap backends that name their address, in their order.
 std::vector<CommandNic> CommandNics(std::string_view command);

@@ -174,9 +174,14 @@ void TakeMac(const CommandNic &nic, HeldTap *tap) {
 // By the interface or the descriptor that the command line names; or there is but one on both sides.
 void ReadMacs(const std::vector<CommandNic> &nics, Process *process) {
     for (const CommandNic &nic : nics) {
+        for (u32 descriptor : nic.descriptors) {
+            auto found = process->held.find(descriptor);
+            if (found != process->held.end()) {
+                TakeMac(nic, &found->second);
+            }
+        }
         for (auto &[descriptor, tap] : process->held) {
-            if ((!nic.interface.empty() && nic.interface == tap.name) ||
-                std::find(nic.descriptors.begin(), nic.descriptors.end(), descriptor) != nic.descriptors.end()) {
+            if (!nic.interface.empty() && nic.interface == tap.name) {
                 TakeMac(nic, &tap);
             }
         }
@@ -230,7 +235,7 @@ void ScanProcess(Scan *scan, u32 pid) {
     scan->guests->refused += error == EACCES || error == EPERM ? 1 : 0;
     for (u32 descriptor : descriptors) {
         HeldTap tap;
-        if (TapOf(scan, process, descriptor, &tap)) {
+        if (process.held.size() < MAX_HELD && TapOf(scan, process, descriptor, &tap)) {
             process.held.emplace(descriptor, tap);
         }
     }

@@ -40,6 +40,7 @@ struct Guests {
 
 constexpr u32 MAX_GUESTS = 65536;
 constexpr u32 MAX_VCPUS = 4096;       // of a guest; what claims more has none
+constexpr u32 MAX_HELD = 4096;        // descriptors of taps that are looked at in a process
 constexpr u32 MAX_COMMAND = 1 << 20;  // bytes of a command line; a longer one tells nothing
 
 // FINE also when some processes could not be looked at. Fails when there is no list of processes.
