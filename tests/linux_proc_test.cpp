@@ -105,7 +105,7 @@ TEST_F(Tree, NamesOfThreadsPassForNoFigure) {
     Put("7/task/8/status", "Name:\tCpus_allowed_list:\t1\nCpus_allowed_list:\t4\n");
     Put("7/task/8/sched", "\nnr_migrations : 3 (8, #threads: 1)\nse.nr_migrations : 4\n" + std::string(40, '-') +
                               "\nse.nr_migrations   :   41\nnr_wakeups_remote : 42\nnr_switches : 43\n");
-    for (u32 kept : {9, 1, 0}) {  // the rest is opened by each read, and a thread known by its start
+    for (u32 kept : {9U, 1U, 0U}) {  // the rest is opened by each read, and a thread known by its start
         ProcLimitKept(kept);
         Put("7/task/8/stat", stat + "250 0 0\n");
         Threads threads;

@@ -190,7 +190,7 @@ bool TakeAttribute(std::string_view *rest, Attribute *attribute) {
     }
     *attribute = {head.nla_type & static_cast<u32>(NLA_TYPE_MASK),
                   rest->substr(NLA_HDRLEN, head.nla_len - static_cast<size_t>(NLA_HDRLEN))};
-    rest->remove_prefix(std::min(rest->size(), size_t{NLA_ALIGN(head.nla_len)}));
+    rest->remove_prefix(std::min(rest->size(), static_cast<size_t>(NLA_ALIGN(head.nla_len))));
     return true;
 }
 

@@ -271,12 +271,16 @@ Outcome GuestsScan(const ProcRoot &root, Guests *guests) {
 }
 
 const HeldTap *GuestsFind(const Guests &guests, const char *name, u32 index) {
-    for (const auto &[itsIndex, itsName] : {std::pair<u32, const char *>{0, name}, {index, ""}}) {
-        auto before = [&](const HeldTap &tap, const char *key) {
-            return tap.index != itsIndex ? tap.index < itsIndex : strcmp(tap.name, key) < 0;
+    struct Key {
+        u32 index;
+        const char *name;
+    };
+    for (const Key &key : {Key{0, name}, Key{index, ""}}) {
+        auto before = [](const HeldTap &tap, const Key &one) {
+            return tap.index != one.index ? tap.index < one.index : strcmp(tap.name, one.name) < 0;
         };
-        auto found = std::lower_bound(guests.taps.begin(), guests.taps.end(), itsName, before);
-        if (found != guests.taps.end() && found->index == itsIndex && strcmp(found->name, itsName) == 0) {
+        auto found = std::lower_bound(guests.taps.begin(), guests.taps.end(), key, before);
+        if (found != guests.taps.end() && found->index == key.index && strcmp(found->name, key.name) == 0) {
             return &*found;
         }
     }
