@@ -33,6 +33,7 @@ std::string Done(int error = 0) {
 std::string Told(int index, const char *name, const char *kind, u32 master = 0, u16 type = RTM_NEWLINK, u16 flags = 0) {
     ifinfomsg header = {};
     header.ifi_index = index;
+    header.ifi_type = 1;
     std::string mac = std::string("\2\0\0\0\0", 5) + static_cast<char>(index);
     return Message(type,
                    Bytes(header) + Attr(IFLA_IFNAME, name) + Attr(0x3ff0, "newer than we are") +

@@ -17,6 +17,7 @@
 
 #include <cstring>
 #include <unordered_map>
+#include <unordered_set>
 
 constexpr u64 NOTICE_LOOK = 5000000;  // ns between two looks for changed interfaces
 
@@ -87,8 +88,8 @@ struct LinuxHost {
     u32 linkChange = 0;       // of the table, as far as `members` goes
     std::vector<u32> lowers;  // interfaces that a macvlan or macvtap stands on, ascending
     std::vector<SwitchEntry> switches;
-    std::vector<Member> members;     // ascending by switch, then index
-    std::vector<std::string> shown;  // names of switches that were listed, or asked for
+    std::vector<Member> members;            // ascending by switch, then index
+    std::unordered_set<std::string> shown;  // names of switches that were listed, or asked for
 
     bool scanned = false;
     Guests guests{};

@@ -170,16 +170,6 @@ void PutGuest(LinuxHost *host, const Link &link, const HeldTap &tap, char *recor
     PutMac(record, port_status::VNIC_MAC, GuestMac(host, link, tap));
 }
 
-bool WasShown(const LinuxHost &host, const std::string &name) {
-    return std::find(host.shown.begin(), host.shown.end(), name) != host.shown.end();
-}
-
-void Show(LinuxHost *host, const char *name) {
-    if (!WasShown(*host, name)) {
-        host->shown.emplace_back(name);
-    }
-}
-
 }  // namespace
 
 Outcome HostLinks(LinuxHost *host) {
@@ -289,7 +279,7 @@ KnfStatus SwitchList(LinuxHost *host, const Params & /*keys*/, Params *entries) 
         return StatusOf(outcome);
     }
     for (const SwitchEntry &entry : host->switches) {
-        Show(host, entry.name);
+        host->shown.insert(entry.name);
         entries->push_back(ParamOf(std::string(entry.name)));
     }
     return STATUS_OK;
@@ -302,9 +292,9 @@ KnfStatus SwitchPorts(LinuxHost *host, const Params &keys, Params *entries) {
     auto entry = std::find_if(host->switches.begin(), host->switches.end(),
                               [&](const SwitchEntry &one) { return keys[0].text == one.name; });
     if (entry == host->switches.end()) {
-        return WasShown(*host, keys[0].text) ? STATUS_OK : STATUS_NOT_FOUND;
+        return host->shown.count(keys[0].text) != 0 ? STATUS_OK : STATUS_NOT_FOUND;
     }
-    Show(host, entry->name);
+    host->shown.insert(entry->name);
     auto member = std::lower_bound(host->members.begin(), host->members.end(), entry->index,
                                    [](const Member &one, u32 index) { return one.switchIndex < index; });
     for (; member != host->members.end() && member->switchIndex == entry->index; ++member) {

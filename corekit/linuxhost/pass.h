@@ -12,7 +12,7 @@ constexpr u64 PASS_FLOOR =
 struct Pass {
     u32 generation = 0;  // 0: none yet
     u32 reads = 0;       // served from it
-    u32 expected = 0;    // reads of the one before
+    u32 expected = 0;    // reads of the ones before; a pass may take several, of which the last serves only few
     u64 startedAt = 0;   // ns
 };
 
@@ -22,7 +22,7 @@ inline bool PassJoin(Pass *pass, u32 *served, u64 now) {
     u64 age = now - pass->startedAt;
     bool fresh = pass->generation != 0 && age < PASS_AGE && (*served != pass->generation || age < PASS_FLOOR);
     if (!fresh) {
-        pass->expected = pass->reads;
+        pass->expected = pass->reads > pass->expected / 2 ? pass->reads : pass->expected / 2;
         pass->generation++;
         pass->generation += pass->generation == 0 ? 1 : 0;
         pass->startedAt = now;

@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <linux/if_arp.h>
 #include <linux/if_link.h>
 #include <linux/rtnetlink.h>
 #include <sys/socket.h>
@@ -73,6 +74,9 @@ bool Parse(const nlmsghdr *message, Link *link) {
     link->flags = header.ifi_flags;
     link->type = header.ifi_type;
     link->kind = KindOf(told.kind);
+    if (link->type != ARPHRD_ETHER) {  // the address of a tunnel is none of this kind
+        memset(link->mac, 0, sizeof link->mac);
+    }
     if ((known & KNOWS_FOREIGN) != 0 || link->lower == link->index) {
         link->lower = 0;
     }
