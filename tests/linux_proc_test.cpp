@@ -18,7 +18,7 @@ namespace {
 using Strings = std::vector<std::string>;
 
 struct Tree : testing::Test {
-    std::filesystem::path top = testing::TempDir() + "tree-" + std::to_string(getpid());
+    std::filesystem::path top = testing::TempDir() + "tree-" + std::to_string(gettid());
     ProcRoot root;
     Tree() {
         std::filesystem::create_directories(top);
