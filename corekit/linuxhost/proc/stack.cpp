@@ -11,8 +11,8 @@ constexpr const char *FILES[] = {"snmp", "netstat", "snmp6"};  // the last has a
 
 struct Key {
     StackCounter counter;
-    const char *group;  // before the colon of a line of keys; empty in snmp6
-    const char *key;
+    std::string_view group;  // before the colon of a line of keys; empty in snmp6
+    std::string_view key;
 };
 
 // clang-format off

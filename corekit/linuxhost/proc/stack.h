@@ -1,5 +1,5 @@
 // Counters of the host's IP stack, of the network namespace that the calling thread was in when the files were opened:
-// /proc/net/snmp, netstat and snmp6, found by key. One read of the three a generation, about 90 us, kept open.
+// /proc/net/snmp, netstat and snmp6, found by key. One read of the three a generation, about 80 us, kept open.
 #pragma once
 
 #include "corekit/linuxhost/file.h"
