@@ -2,6 +2,7 @@
 #include "corekit/entry/control.h"
 #include "interface/corekit.h"
 #include "tests/fixed_clock.h"
+#include "tests/run_meter.h"
 
 #include <cstring>
 #include <gtest/gtest.h>
@@ -156,6 +157,24 @@ TEST(Corekit, ErrorsInDescriptionsNameLineAndExpectation) {
         EXPECT_FALSE(CorekitLoad(std::string("host name=h\n") + text, &error));
         EXPECT_EQ(error.substr(0, strlen(expected)), expected);
     }
+    CorekitRecord(true);
+    setenv("COREKIT_HOST", "/nowhere", 1);
+    EXPECT_EQ(HckSyscall_Init(1, 0, 0), -1);
     Bytes record(36);
     EXPECT_NE(Get(603, {}, &record), 0U);  // nothing of a bad description stays connected
+    Load("");
+    EXPECT_EQ(HckSyscall_Init(1, 0, 0), 0);
+    EXPECT_NE(CorekitRecorded().front(), "init -> 0x0");
+    EXPECT_EQ(CorekitRecorded().back(), "init -> 0x0");
+}
+
+// Every layout, offset, factor and rate of the simulated host in one figure, noise included. After a wanted change the
+// new one comes from the test's own output.
+TEST(Corekit, RecordsOfTheBuiltInHostAreTheKnownOnes) {
+    MeterRun run =
+        RunScript("", "R=\"${METER% *} " RECORD_BINARY "\"; $R -o s -i 3 -n 2 >out && $R --dump s.1 >dump && "
+                      "sed 1d dump | cksum >sum; head -1 dump >>sum; wc -c <s.1 >size");
+    EXPECT_TRUE(RunFile("sum").starts_with("3868727870 315028\n")) << RunFile("sum");
+    EXPECT_EQ(Count(RunFile("sum"), " time=1700000003.000000000 "), 1U) << RunFile("sum");
+    EXPECT_LT(std::stoi(RunFile("size")), 30000) << "packed to a sixth";
 }

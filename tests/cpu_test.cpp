@@ -95,7 +95,11 @@ TEST(Vcpu, PercentagesAreSignedAndCountsAreNot) {
                            " at=64 width=8 start=500000 then=4:100000\n" + Steps("772 " + VCPU, "36 4 70 67108868") +
                            Steps("793 " + VCPU, "0 8 11 67108868") + Steps("795 " + VCPU + " \"L3\"", "0 8 12 80") +
                            STILL + "field 795 77 \"L3\" at=0 width=8 start=8 then=4:7\n";
-    MeterRun run = RunMeter(HOST + counters, "-p 7 -t v -i 4");
+    MeterRun run = RunMeter(HOST + counters, "-p 7 -t v -i 4 -n 2");
+    nlohmann::json second = run.Port(7, 1)["vcpu"][0];
+    for (const auto &[key, figure] : second.items()) {
+        EXPECT_TRUE(key == "id" || figure == 0) << key << " is not turned over";
+    }
     const std::string idle = "\"id\": 77, \"used\": 0.00, \"ready\": 0.00, \"cstp\": 0.00, \"actnot\": 0.00, "
                              "\"migtot\": 0, \"migl3\": ";
     EXPECT_EQ(Between(run.out, ",\n  \"vcpu\"", "]"),
@@ -236,6 +240,8 @@ TEST(VcpuHisto, OptionFollowsTheUsersOfAllPorts) {
         }
         EXPECT_EQ(with, row.withHistos) << row.fault;
     }
+    std::string journal = RunMeter(TWO, "-S sw0 -t hV -i 1").journal;
+    EXPECT_TRUE(journal.ends_with("set 336 \"sw0\" 9 : \"stop\" \"output\" -> 0x0\n" + off)) << "behind all ports";
 }
 
 TEST(VcpuHisto, FailedReadSkipsLaterVcpusOfThePassButNotTheirTimes) {

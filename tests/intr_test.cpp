@@ -30,11 +30,11 @@ TEST(Intr, FigureLeavesOutAVectorOrAPcpuOrTakesAnothers) {
     EXPECT_EQ(Count(run.out, " },\n  \"intr\": {\"count\": 2438, \"used\": 108.03}}],"), 1U);
     EXPECT_EQ(Count(run.out, " },\n  \"intr\": {\"count\": 0, \"used\": 0.00}}],"), 1U) << "not turned over";
     EXPECT_EQ(Count(run.trace, "get 840 "), 3U * 2 * 2) << "passes, vectors, pcpus";
-    host = HOST + Steps("64 0", 16777217, -1ULL) + Steps("64 1", 0, 0) + Steps("4294967364 0", 0, 0) +
-           Steps("4294967364 1", 0, 0);
+    host = HOST + Steps("64 0", 16777217, (1ULL << 63) + (1ULL << 38)) + Steps("64 1", 0, 0) +
+           Steps("4294967364 0", 0, 0) + Steps("4294967364 1", 0, 0);
     nlohmann::json absolute = RunMeter(host, "-a -p 9 -t i -i 4").Port(9)["intr"];
     EXPECT_EQ(absolute["count"], 16777216) << "not narrowed";
-    EXPECT_EQ(absolute["used"], 1844674407370955.25) << "2^64 / 10000";
+    EXPECT_EQ(absolute["used"], 922337203685477.625) << "2^63 / 10000: unsigned, and narrowed";
 }
 
 // A NIC and the names on the one vector.

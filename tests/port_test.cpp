@@ -45,6 +45,9 @@ TEST(Port, ClockThatStandsStillIsToldAndDividesByAMillionth) {
     MeterRun run = RunMeter(HOST, "-p 7 -i 0");
     EXPECT_EQ(run.err, "Log0: Time going backwards?: Diff is 0.000000\n");
     EXPECT_EQ(run.Port(7)["txpps"], 0);
+    EXPECT_EQ(RunMeter(HOST, "-p 7 -i 0", {"FIXED_CLOCK_STEP=-177721711"}).err,
+              "Log0: Time going backwards?: Diff is -1421.773682\n")
+        << "-1421.773688 before it is narrowed to single precision";
 }
 
 TEST(Port, MacComesFromTheFieldOfItsKind) {

@@ -1,5 +1,6 @@
 #include "tests/run_meter.h"
 
+#include <csignal>
 #include <cstdlib>
 #include <fstream>
 #include <gtest/gtest.h>
@@ -9,10 +10,25 @@
 
 namespace {
 
+// What the program inherits is the same everywhere: nohup, for one, ignores SIGHUP.
+const bool signalsAsUsual = [] {
+    for (int signal : {SIGINT, SIGTERM, SIGHUP, SIGPIPE, SIGXFSZ}) {
+        std::signal(signal, SIG_DFL);
+    }
+    sigset_t none;
+    sigemptyset(&none);
+    return sigprocmask(SIG_SETMASK, &none, nullptr) == 0;
+}();
+
+// A directory of its own, with links to the binaries and the data, whose own paths may hold blanks.
 const std::string &Directory() {
     static const std::string directory = [] {
         char name[] = "/tmp/meter-test-XXXXXX";
-        return std::string(mkdtemp(name)) + "/";
+        EXPECT_NE(mkdtemp(name), nullptr);
+        std::string path = std::string(name) + "/";
+        EXPECT_EQ(symlink(BUILD_DIRECTORY, (path + "build").c_str()), 0);
+        EXPECT_EQ(symlink(DATA_DIRECTORY, (path + "data").c_str()), 0);
+        return path;
     }();
     static const struct Cleaner {
         std::string path = directory;
@@ -47,17 +63,19 @@ MeterRun RunScript(const std::string &host, const std::string &script, const Run
     for (const char *left : {"out", "err", "trace", "journal"}) {
         unlink((Directory() + left).c_str());
     }
+    std::string build = Directory() + "build/";
     std::string meter = "env COREKIT_TRACE=trace COREKIT_JOURNAL=journal " + options.environment;
     if (!host.empty()) {
         WriteRunFile("host.txt", host);
     }
     meter += host.empty() ? " COREKIT_HOST=demo" : " COREKIT_HOST=host.txt";
     if (!options.realClock) {
-        meter += " ASAN_OPTIONS=verify_asan_link_order=0 LD_PRELOAD=" FIXED_CLOCK;
+        meter += " ASAN_OPTIONS=verify_asan_link_order=0 LD_PRELOAD=" + build + "libfixed_clock.so";
     }
-    WriteRunFile("script", "METER='" + meter + " " METER_BINARY "'\n" + script + "\n");
+    WriteRunFile("script", "METER='" + meter + " " + build + "lan-meter'\n" + script + "\n");
     int status = std::system(("cd " + Directory() + " && sh ./script").c_str());
     int code = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    EXPECT_EQ(Count(RunFile("trace"), "\nbeyond "), 0U) << "an index past the end of a list";
     return {code, RunFile("out"), RunFile("err"), RunFile("trace"), RunFile("journal")};
 }
 
@@ -84,6 +102,7 @@ std::string Steps(const std::string &record, const std::string &counters) {
     std::istringstream words(counters);
     std::ostringstream out;
     for (unsigned long long at, size, from, by; words >> at >> size >> from >> by;) {
+        from += by != 0 && size == 8 ? 1ULL << 53 : 0;
         out << "field " << record << " at=" << at << " width=" << size << " start=" << from << " then=4:" << from + by
             << "\n";
     }

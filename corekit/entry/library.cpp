@@ -97,6 +97,15 @@ KnfStatus AddParam(KnfParamList list, const KnfParamRec &param) {
     return status;
 }
 
+// Null past the end, where a caller that counts right never looks.
+KnfParamRec *Entry(KnfParamList list, uint32_t index) {
+    KnfParamRec *param = ParamListAt(list, index);
+    if (param == nullptr) {
+        Contained(STATUS_BAD_PARAM, [&] { return Told(STATUS_BAD_PARAM, "beyond", nullptr, {ParamOf(index)}); });
+    }
+    return param;
+}
+
 bool Load(const std::string &text, const char *file, std::string *error) {
     Library &library = Lib();
     CorekitUnload();
@@ -265,7 +274,7 @@ uint32_t KNF_ParamListUsedCount(KnfParamList list) {
 }
 
 KnfParam KNF_ParamListGetParam(KnfParamList list, uint32_t index) {
-    return ParamListAt(list, index);
+    return Entry(list, index);
 }
 
 int64_t KNF_ParamGetInt(KnfParam param) {
@@ -277,7 +286,7 @@ const char *KNF_ParamGetString(KnfParam param) {
 }
 
 KnfStatus KNF_ParamListGetString(KnfParamList list, uint32_t index, const char **text) {
-    const KnfParamRec *param = ParamListAt(list, index);
+    const KnfParamRec *param = Entry(list, index);
     if (param == nullptr || !param->isText || text == nullptr) {
         return STATUS_BAD_PARAM;
     }
