@@ -54,5 +54,6 @@ void WriteRunFile(const std::string &name, const std::string &text);
 std::size_t Count(const std::string &text, const std::string &part);
 
 // Lines for counters of a record, each as offset, width, start and what it moves by between seconds 0 and 4. An 8-byte
-// one that moves starts far above that, so that a sum of two samples, or a sample alone, is never taken for their difference.
+// one that moves starts far above that, so that a sum of two samples, or a sample alone, is never taken for their
+// difference.
 std::string Steps(const std::string &record, const std::string &counters);
