@@ -208,6 +208,19 @@ END)",
     EXPECT_EQ(run.journal, "set 520 \"Cpu\" \"TrackHistos\" : 1 -> 0x0\nset 520 \"Cpu\" \"TrackHistos\" : 0 -> 0x0\n");
 }
 
+TEST(Driver, HandlersThatCannotBeInstalledAreToldOnceAndTheRunGoesOn) {
+    for (const char *fault : {"sigaction 1", "sigaction 2", "sigaction 3", "sigaction 5", "timer_create 1"}) {
+        std::string script = "LIBC_FAULT='" + std::string(fault) + "' $METER-libc-faults -p 7 -i 1 >out 2>err";
+        MeterRun run = RunScript(HOST, script, {"", true});
+        EXPECT_EQ(run.status, 0) << fault;
+        EXPECT_EQ(run.err,
+                  "Log0: Error Registering SIGINT Signal Handler\nLog0: If you histograms, you should either:\n"
+                  "\t1. Let the program end.\t2. Manually disable them.Otherwise, histograms will stay on and "
+                  "hurt performance\n")
+            << fault;
+    }
+}
+
 TEST(Driver, SignalAmidAPortWritesNoFurtherText) {
     std::string host = "host\nswitch s\nuplink switch=s port=7 nic=n rxqueues=1000 filters=1\n";
     MeterRun run = RunMeter(host + "fault list 123 \"n\" 1 signal=15\n", "-p 7 -t vq -i 1");

@@ -2,10 +2,12 @@
 // environment LIBC_FAULT is "NAME N" with a name from below: the Nth such call of the program fails. "short" and
 // "interrupted" are further ways for write to fail. With LIBC_COUNTS all calls are counted there at the end.
 #include <cerrno>
+#include <csignal>
 #include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <ctime>
 #include <sys/types.h>
 
 extern "C" {
@@ -14,12 +16,14 @@ void *__real_calloc(size_t count, size_t size);
 void *__real_realloc(void *memory, size_t size);
 ssize_t __real_write(int fd, const void *buffer, size_t size);
 int __real_open64(const char *path, int flags, ...);
+int __real_sigaction(int signal, const struct sigaction *action, struct sigaction *before);
+int __real_timer_create(clockid_t clock, sigevent *event, timer_t *timer);
 }
 
 namespace {
 
-enum Call { MALLOC, CALLOC, REALLOC, WRITE, OPEN, CALLS };
-constexpr const char *NAMES[CALLS] = {"malloc", "calloc", "realloc", "write", "open"};
+enum Call { MALLOC, CALLOC, REALLOC, WRITE, OPEN, SIGACTION, TIMER, CALLS };
+constexpr const char *NAMES[CALLS] = {"malloc", "calloc", "realloc", "write", "open", "sigaction", "timer_create"};
 
 struct Plan {
     char name[32] = "";
@@ -77,5 +81,13 @@ ssize_t __wrap_write(int fd, const void *buffer, size_t size) {
 int __wrap_open64(const char *path, int flags, ...) {
     errno = EMFILE;
     return Fails("open", ++plan.seen[OPEN]) ? -1 : __real_open64(path, flags, 0644);
+}
+
+int __wrap_sigaction(int signal, const struct sigaction *action, struct sigaction *before) {
+    return Fails("sigaction", ++plan.seen[SIGACTION]) ? -1 : __real_sigaction(signal, action, before);
+}
+
+int __wrap_timer_create(clockid_t clock, sigevent *event, timer_t *timer) {
+    return Fails("timer_create", ++plan.seen[TIMER]) ? -1 : __real_timer_create(clock, event, timer);
 }
 }

@@ -76,7 +76,7 @@ void InstallTerminationHandlers(i32 (*teardown)()) {
     int flags = hasTimer ? SA_RESTART : 0;
     bool registered = Register(SIGINT, OnTerminate, flags) && Register(SIGTERM, OnTerminate, flags) &&
                       (IgnoredAtStart(SIGHUP) || Register(SIGHUP, OnTerminate, flags));
-    if (!registered) {
+    if (!registered || !hasTimer) {
         LogMsg(0, "Error Registering SIGINT Signal Handler\n");
         LogMsg(0, "If you histograms, you should either:\n\t1. Let the program end.\t2. Manually disable them."
                   "Otherwise, histograms will stay on and hurt performance\n");
