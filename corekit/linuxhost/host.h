@@ -32,6 +32,8 @@ struct Port {
     u32 joined = 0;  // the state of the host that `type` and `tap` are of
     i64 type = 0;
     const HeldTap *tap = nullptr;  // of the host's guests; null unless a process holds it
+    u32 scan = 0;                  // that `tap` is of, and the link
+    u32 tapBirth = 0;
     LinkCounters counters{};
     u32 filled = 0;     // generation of the counters
     u32 served = 0;     // as a port
@@ -92,6 +94,7 @@ struct LinuxHost {
     std::unordered_set<std::string> shown;  // names of switches that were listed, or asked for
 
     bool scanned = false;
+    u32 scans = 0;
     Guests guests{};
     bool addressed = false;
     std::vector<u32> addresses;

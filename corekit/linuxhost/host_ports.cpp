@@ -202,6 +202,7 @@ void HostForget(LinuxHost *host) {
 Outcome HostScan(LinuxHost *host) {
     if (!host->scanned) {
         host->scanned = true;
+        host->scans++;
         host->change++;
         return GuestsScan(host->root, &host->guests);
     }
@@ -215,7 +216,12 @@ u32 HostSwitchOf(const LinuxHost &host, const Link &link) {
 Port *HostJoin(LinuxHost *host, const Link &link) {
     Port *port = &host->ports[link.index];
     if (port->joined != host->change) {
-        port->tap = Holder(host, link);
+        // Who holds a tap is told by its name, which is right at the moment of the scan and may change behind it.
+        if (!host->scanned || port->scan != host->scans || port->tapBirth != link.birth) {
+            port->tap = Holder(host, link);
+            port->scan = host->scans;
+            port->tapBirth = link.birth;
+        }
         port->type = TypeOf(host, link, port->tap);
         port->joined = host->change;
     }
