@@ -12,6 +12,8 @@ constexpr char DROPS[] = "dropped packets and errors of the interface";
 constexpr char STACK[] = "/proc/net/snmp of the network namespace";
 constexpr char STACK6[] = "/proc/net/snmp6 of the network namespace";
 constexpr char SOCKETS[] = "sum over the TCP sockets, those that ended since the start too";
+constexpr char SOCKETS_HEARD[] =
+    "sum over the TCP sockets, those that ended since the start too; the end of a connection counts as one byte";
 
 }  // namespace
 
@@ -33,7 +35,7 @@ const KeyRow KEY_ROWS[] = {
     {"ports.id", EXACT, "interface index"},
     {"ports.mac", CLOSE, "of the interface; of a guest behind a tap what its command line says, or what the bridge learned, "
                          "which ages out after 300 s of silence; else zeros"},
-    {"ports.rxmode", EXACT, "of the interface: 1 promiscuous, 2 all multicast"},
+    {"ports.rxmode", EXACT, "as set on the interface: 1 promiscuous, 2 all multicast; not what a sniffer or a bridge asks for"},
     {"ports.uplink", EXACT, "an interface with a device behind it"},
     {"ports.txpps", CLOSE, OFFLOAD},
     {"ports.txmbps", EXACT, "bytes of the interface, from its client's side"},
@@ -92,8 +94,8 @@ const KeyRow KEY_ROWS[] = {
     {"ports.tcptx.winupd", UNMEASURED, "the kernel does not count them"},
     {"ports.tcprx.pps", EXACT, "InSegs"},
     {"ports.tcprx.datapct", EXACT, SOCKETS, FEATURE_TCP_SOCKETS},
-    {"ports.tcprx.mbps", EXACT, SOCKETS, FEATURE_TCP_SOCKETS},
-    {"ports.tcprx.size", EXACT, SOCKETS, FEATURE_TCP_SOCKETS},
+    {"ports.tcprx.mbps", CLOSE, SOCKETS_HEARD, FEATURE_TCP_SOCKETS},
+    {"ports.tcprx.size", CLOSE, SOCKETS_HEARD, FEATURE_TCP_SOCKETS},
     {"ports.tcprx.dups", CLOSE, "DelayedACKLost: segments whose data had come before"},
     {"ports.tcprx.oo", EXACT, "TCPOFOQueue"},
     {"ports.tcprx.winprb", UNMEASURED, "the kernel does not count them"},
@@ -111,7 +113,7 @@ const KeyRow KEY_ROWS[] = {
     {"ports.wdt.migct", EXACT, "migrations of the thread", FEATURE_MIGRATIONS},
     {"ports.wdt.overrunct", UNMEASURED, "Linux has no such thing to count"},
     {"ports.wdt.afftype", EXACT, "always \"pcpu\""},
-    {"ports.wdt.affval", EXACT, "the CPU that the thread is bound to; -1 when it may run on several"},
+    {"ports.wdt.affval", EXACT, "the CPU that the thread is bound to, as of the last 10 s; -1 when it may run on several"},
     {"ports.wdt.name", EXACT, "a vhost worker (NetWdt-Async-PID-vhost-TID), or the kernel's own name of a NIC's thread"},
     {"ports.vcpu.id", EXACT, "thread", FEATURE_TAP_HOLDERS, ABSENT},
     {"ports.vcpu.used", EXACT, "schedstat of the thread; up to a tick old while it runs", FEATURE_SCHEDSTAT, ABSENT},
