@@ -176,10 +176,13 @@ TEST(Corekit, ErrorsInDescriptionsNameLineAndExpectation) {
 TEST(Corekit, RecordsOfTheBuiltInAndOfABareHostAreTheKnownOnes) {
     WriteRunFile("bare", "host\nswitch s\nuplink switch=s port=1 nic=n\nhostnic switch=s port=2 name=h\n"
                          "vm v leader=7\nvnic switch=s port=3 vm=v model=parlan2\nworldlet w\nvector 9 names=n\n");
-    MeterRun run = RunScript("", "for host in '' bare; do COREKIT_HOST=$host ${METER% *} " RECORD_BINARY
+    MeterRun run = RunScript("", "for host in demo bare; do ${METER% *} COREKIT_HOST=$host " RECORD_BINARY
                                  " -o s -i 3 -n 2 && ${METER% *} " RECORD_BINARY " --dump s.1 >>dump; wc -c s.1 >>size;"
                                  " done >out; grep -v ^snapshot dump | cksum >sum; head -1 dump >>sum");
     EXPECT_TRUE(RunFile("sum").starts_with("611562811 396157\n")) << RunFile("sum");
     EXPECT_EQ(Count(RunFile("sum"), " time=1700000003.000000000 "), 1U) << RunFile("sum");
+    // With all letters, and so with histograms, which no snapshot holds.
+    RunScript("", "$METER -A -t vqiWcCQhV -i 3 -n 3 | cksum >sum");
+    EXPECT_EQ(RunFile("sum"), "3620711415 105727\n");
     EXPECT_LT(std::stoi(RunFile("size")), 30000) << "packed to a sixth";
 }
