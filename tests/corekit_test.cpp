@@ -93,10 +93,12 @@ TEST(Corekit, NullAndFullListsAreRefusedAndHarmless) {
 
 TEST(Corekit, CountersFollowClockRateAndCourse) {
     Load(std::string(SMALL) + "field 269 \"s\" 5 at=16 width=8 start=18446744073709551615 rate=2\n"
-                              "field 269 \"s\" 5 at=88 width=4 start=100 rate=-7 then=2:50 then=3:0xffffffff:1\n");
+                              "field 269 \"s\" 5 at=88 width=4 start=100 rate=-7 then=2:50 then=3:0xffffffff:1\n"
+                              "field 269 \"s\" 5 at=96 width=8 start=-9223372036854775808\n");
     Bytes start = Record(269, {"s", 5}, 160);
     EXPECT_EQ(start, Record(269, {"s", 5}, 160));  // a clock that stands still moves nothing, noise included
     EXPECT_NE(At(start, 40), 0U);
+    EXPECT_EQ(At(start, 96), 0x8000000000000000U);
     FixedClockAdvance(1500000);
     Bytes later = Record(269, {"s", 5}, 160);
     EXPECT_EQ(At(later, 0) - At(start, 0), 1126U);   // 751 a second
@@ -152,6 +154,7 @@ TEST(Corekit, ErrorsInDescriptionsNameLineAndExpectation) {
         {"field 603 at=33 width=4 start=1\n", "text:2: at= goes past the record: expected 4 bytes within 36"},
         {"field 9 at=0 width=4 start=1\n", "text:2: no such instance: expected node and keys"},
         {"field 603 at=8 width=4 start=1x\n", "text:2: value \"1x\": expected a number of 64 bits"},
+        {"field 603 at=8 width=8 start=-9223372036854775809\n", "text:2: value \"-9223372036854775809\": expected a"},
         {"host name=again\n", "text:2: keyword \"host\": expected one host line"},
     };
     for (const auto &[text, expected] : cases) {
