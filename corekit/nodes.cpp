@@ -18,9 +18,7 @@ constexpr RecordSize SIZES[] = {
     {NODE_NIC_STATS, 4296}, {NODE_RXQ_INFO, 12}, {NODE_RXQ_FILTER, 36}, {NODE_TXQ_INFO, 12}, {NODE_TXQ_STATS, 20},
     {NODE_PORT_STATUS, 3316}, {NODE_PORT_STATS, 160}, {NODE_PARLAN2, 112}, {NODE_TX_WORLDLET, 20}, {NODE_COALESCE, 68},
     {NODE_COALESCE_2, 68}, {NODE_COALESCE_RX, 36}, {NODE_COALESCE_TX, 32}, {NODE_COALESCE_TXCOMP, 24},
-    {NODE_CLUSTERS_IN, HistogramSize(14)}, {NODE_CLUSTERS_OUT, HistogramSize(14)}, {NODE_SIZES_IN, HistogramSize(11)},
-    {NODE_SIZES_OUT, HistogramSize(11)}, {NODE_INTERVALS_IN, HistogramSize(18)},
-    {NODE_INTERVALS_OUT, HistogramSize(18)}, {NODE_PARLAN3_TX, 140}, {NODE_PARLAN3_RX, 128}, {NODE_PARLAN3_QUEUE, 16},
+    {NODE_PARLAN3_TX, 140}, {NODE_PARLAN3_RX, 128}, {NODE_PARLAN3_QUEUE, 16},
     {NODE_PORT_TYPE, 2056}, {NODE_WORLD_CARTEL, 4}, {NODE_CONFIG_OPTION, 1572}, {NODE_TOPOLOGY, 36},
     {NODE_PCPU_INFO, 200}, {NODE_GROUP_LEADER, 4}, {NODE_CARTEL_GROUP, 8}, {NODE_VCPU_TIMES, 120},
     {NODE_VCPU_EVENTS, 64}, {NODE_VCPU_HISTO, 352}, {NODE_VCPU_MIGRATIONS, 8}, {NODE_VCPU_L3, 8},
@@ -33,6 +31,9 @@ constexpr auto SIZE_OF = [] {
     std::array<u16, NODE_WORLDLET_STATS + 1> sizes = {};
     for (const RecordSize &record : SIZES) {
         sizes[record.node] = record.size;
+    }
+    for (const HistogramNodes &histogram : HISTOGRAM_NODES) {
+        sizes[histogram.input] = sizes[histogram.output] = HistogramSize(histogram.limits);
     }
     return sizes;
 }();

@@ -149,6 +149,13 @@ TEST(Driver, ReaderThatGoesAwayEndsAnEndlessRun) {
     EXPECT_NE(run.err.find("Error Broken pipe\n"), std::string::npos);
 }
 
+// Milliseconds from a signal to the end, for a machine that does other things too: the torture run holds runs to less.
+#ifdef __SANITIZE_ADDRESS__
+constexpr int LIMIT = 5000;
+#else
+constexpr int LIMIT = 1000;
+#endif
+
 // Starts a run, sends it a signal after a while, and measures how long it takes to end.
 MeterRun Signalled(const std::string &command, const std::string &signal) {
     // Enough ports that their messages fill a pipe.
@@ -163,7 +170,7 @@ TEST(Driver, SignalDuringTheSleepEndsItAtOnceWithAnEmptyOutput) {
         MeterRun run = Signalled("$METER -p 7 -i 100 >out 2>err", signal);
         EXPECT_EQ(RunFile("status"), "1\n") << signal;
         EXPECT_EQ(run.out + run.err, "") << signal;
-        EXPECT_LT(std::stoi(RunFile("ms")), 200) << signal;
+        EXPECT_LT(std::stoi(RunFile("ms")), LIMIT) << signal;
     }
     MeterRun ignored = Signalled("trap '' HUP; $METER -p 7 -i 1 >out 2>err", "HUP");
     EXPECT_EQ(RunFile("status"), "0\n") << "a hang-up that was ignored at start stays ignored";
@@ -179,33 +186,57 @@ TEST(Driver, SignalEndsEveryWaitForAnotherProgram) {
           "{ printf '# '; cat /dev/zero; } >fifo & $METER -C fifo >out 2>err"}) {
         MeterRun run = Signalled(std::string("rm -f fifo; mkfifo fifo; ") + command, "TERM");
         EXPECT_EQ(RunFile("status"), "1\n") << command;
-        EXPECT_LT(std::stoi(RunFile("ms")), 500) << command;
+        EXPECT_LT(std::stoi(RunFile("ms")), LIMIT) << command;
         EXPECT_EQ(run.err, "") << command;
     }
 }
 
-// The panic's message waits for a terminal that nobody reads while tracking is on.
-TEST(Driver, SignalEndsEvenAPanicWithTrackingOff) {
-    WriteRunFile("ports", "83886083 V\nnone\n");
-    MeterRun run = RunScript("", R"(python3 - $METER -C ports <<'END'
+// A signal comes while the tracking is on and standard error is a terminal that nobody reads.
+MeterRun SignalledOnATerminal(const std::string &host, const std::string &arguments) {
+    return RunScript(host, "rm -f status; python3 - $METER " + arguments + R"( <<'END'
 import os, pty, signal, subprocess, sys, time
 mine, its = pty.openpty()
 os.set_blocking(its, False)
-try:
-    while os.write(its, b"x" * 512):
-        pass
-except BlockingIOError:
-    os.set_blocking(its, True)
+for size in 512, 1, 1, 1:  # what is on its way to the other side makes room again
+    try:
+        while os.write(its, b"x" * size):
+            pass
+    except BlockingIOError:
+        time.sleep(0.05)
+os.set_blocking(its, True)
 run = subprocess.Popen(sys.argv[1:], stderr=its)
-while not os.path.exists("journal"):
+while not os.path.exists("trace") or "TrackHistos" not in open("trace").read():
     time.sleep(0.1)
 time.sleep(0.2)
 run.terminate()
 print(run.wait(5), file=open("status", "w"))
 END)",
-                             {"", true});
+                     {"", true});
+}
+
+TEST(Driver, SignalEndsAPanicAndATeardownThatNobodyReads) {
+    std::string host = "host\nswitch s\nvm v leader=9 vcpus=1\nvnic switch=s port=7 vm=v model=3\n";
+    std::string on = "set 520 \"Cpu\" \"TrackHistos\" : 1 -> 0x0\n";
+    WriteRunFile("ports", "7 V\nnone\n");
+    EXPECT_EQ(SignalledOnATerminal(host, "-C ports").journal, on + "set 520 \"Cpu\" \"TrackHistos\" : 0 -> 0x0\n");
     EXPECT_EQ(RunFile("status"), "1\n");
-    EXPECT_EQ(run.journal, "set 520 \"Cpu\" \"TrackHistos\" : 1 -> 0x0\nset 520 \"Cpu\" \"TrackHistos\" : 0 -> 0x0\n");
+    MeterRun run = SignalledOnATerminal(host + "fault set 520 from=2\n", "-p 7 -t V -i 100");
+    EXPECT_EQ(run.journal, on + "set 520 \"Cpu\" \"TrackHistos\" : 0 -> 0xbad000f\n");
+    EXPECT_EQ(RunFile("status"), "1\n");
+}
+
+// The write takes longer than the signal's first cut of a wait would come.
+TEST(Driver, SignalCutsNoWriteToTheKernel) {
+    for (const char *write : {"520 nth=1", "326 nth=1", "336 nth=2"}) {
+        std::string host = "host\nswitch s\nvm v leader=9 vcpus=1\nvnic switch=s port=7 vm=v model=3\n";
+        MeterRun run = RunScript(host + "fault set " + write + " delay=900\n",
+                                 "$METER -p 7 -t hV -i 100 >out 2>err & pid=$!; sleep 0.4; kill -TERM $pid; wait $pid",
+                                 {"", true});
+        EXPECT_EQ(run.status, 1) << write;
+        EXPECT_EQ(run.err, "") << write;
+        EXPECT_EQ(Count(run.journal, " -> 0x0\n"), Count(run.journal, "\n")) << write << run.journal;
+        EXPECT_TRUE(run.journal.ends_with("\"TrackHistos\" : 0 -> 0x0\n")) << write << run.journal;
+    }
 }
 
 TEST(Driver, HandlersThatCannotBeInstalledAreToldOnceAndTheRunGoesOn) {

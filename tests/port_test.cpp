@@ -31,6 +31,14 @@ TEST(Port, RatesComeFromBothCountersAndThePortsOwnTime) {
     EXPECT_EQ(absolute["txeps"], 12.0);
 }
 
+TEST(Port, NameIsThatOfTheLatestPassAndMayGrow) {
+    std::string grows = "field 266 \"sw0\" 7 at=148 width=8 start=0x61 then=3:0x6161616161616161\n"
+                        "fill 266 \"sw0\" 7 at=156 size=1 byte=0\n";
+    MeterRun run = RunMeter(HOST + grows, "-p 7 -i 2 -n 2");
+    EXPECT_EQ(run.Port(7)["name"], "a");
+    EXPECT_EQ(run.Port(7, 1)["name"], "aaaaaaaa");
+}
+
 TEST(Port, CounterThatWentBackwardsIsNegative) {
     std::string back = R"(
 field 269 "sw0" 7 at=72 width=8 start=900 rate=0 then=1:400

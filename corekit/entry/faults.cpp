@@ -4,9 +4,22 @@
 
 #include <algorithm>
 #include <csignal>
+#include <ctime>
+#include <sys/timerfd.h>
+#include <unistd.h>
 #include <utility>
 
 namespace {
+
+// Waits in a read, which the kernel restarts behind a signal whose handler asks for that. False when it was cut short.
+bool Delay(uint32_t milliseconds) {
+    int fd = timerfd_create(CLOCK_MONOTONIC, TFD_CLOEXEC);
+    const itimerspec times = {{0, 0}, {milliseconds / 1000, milliseconds % 1000 * 1000000L}};
+    uint64_t expired = 0;
+    bool whole = timerfd_settime(fd, 0, &times, nullptr) == 0 && read(fd, &expired, sizeof expired) == sizeof expired;
+    close(fd);
+    return whole;
+}
 
 bool Matches(const FaultRule &rule, const FaultCall &call) {
     if ((rule.calls & 1U << call.kind) == 0) {
@@ -49,6 +62,8 @@ KnfStatus FaultsCheck(std::vector<FaultRule> *rules, const FaultCall &call) {
         bool fails = rule.nth != 0 ? rule.seen == rule.nth : rule.seen >= rule.from;
         if (fails && rule.signal != 0) {
             std::raise(rule.signal);
+        } else if (fails && rule.delay != 0) {
+            status = Delay(rule.delay) ? status : rule.status;
         } else if (fails && status == 0) {
             status = rule.status;
         }
@@ -77,6 +92,7 @@ void FaultsTake(Line *line, std::vector<FaultRule> *rules) {
     rule.nth = static_cast<u64>(TakeNumber(line, "nth", 0, 1, MAX_I64));
     rule.from = static_cast<u64>(TakeNumber(line, "from", 1, 1, MAX_I64));
     rule.status = static_cast<KnfStatus>(TakeNumber(line, "status", STATUS_SIMULATED, 1, MAX_ID));
+    rule.delay = static_cast<u32>(TakeNumber(line, "delay", 0, 1, 60000));
     rule.signal = static_cast<int>(TakeNumber(line, "signal", 0, 1, 64));
     if (Complete(line)) {
         rules->push_back(std::move(rule));

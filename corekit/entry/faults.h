@@ -19,7 +19,8 @@ struct FaultRule {
     uint64_t nth = 0;   // 0, or the only matching call that fails
     uint64_t from = 1;  // the first matching call that fails
     KnfStatus status = 0;
-    int signal = 0;  // raised instead of a failure, when not 0
+    int signal = 0;      // raised instead of a failure, when not 0
+    uint32_t delay = 0;  // milliseconds that the call takes instead; it fails when a signal cuts it short
     uint64_t seen = 0;
 };
 

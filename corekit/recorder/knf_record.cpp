@@ -179,7 +179,7 @@ int Record(const Settings &settings) {
         fprintf(stderr, "knf-record: stopped after %lld of %lld snapshots: %s\n", taken, settings.count,
                 strsignal(stopSignal));
     }
-    if (taken > 0) {
+    if (taken > 0 && printed) {
         // A record of a replay lies between two snapshots; one alone tells the ports.
         printf("lan-meter %s -c %s\n", taken > 1 ? "-A" : "-l", Quoted(written.substr(1)).c_str());
         printed = printed && Printed();

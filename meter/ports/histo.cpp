@@ -121,13 +121,13 @@ void HistoFree(Port *port) {
 
 KnfStatus HistoRead(Port *port, bool first, const char **stage) {
     KnfStatus status = 0;
-    EachKind([&](const auto &kind) {
-        if (!first) {
+    if (!first) {
+        EachKind([&](const auto &kind) {
             *stage = kind.stage;
             status = NodeGet(kind.node, port->portParams, port->*kind.record);
-        }
-        return status == 0;
-    });
+            return status == 0;
+        });
+    }
     if (status == 0) {
         HistoOp(port->histoStarted != 0 ? HISTO_RESET : HISTO_START, port);
         port->histoStarted = 1;

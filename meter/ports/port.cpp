@@ -82,14 +82,26 @@ KnfStatus ReadInfo(PortInfo *info, const char **stage) {
     return failedAt(NodeGet(KNF_NODE_PORT_STATUS, statusParams, &info->status), "Port Status");
 }
 
+// Room for a longer name. Without memory for it the port keeps the one that it had: no pass ends the run.
+void GrowName(u32 size, PortIdentity *info) {
+    char *name = static_cast<char *>(std::malloc(size));
+    if (name == nullptr) {
+        LogMsg(0, "Allocating %d bytes for %s failed\n", static_cast<i32>(size), "Client Name");
+        return;
+    }
+    std::free(info->clientName);
+    info->clientName = name;
+    info->clientRoom = size;
+}
+
 void KeepStatus(const PortStatusRecord &status, PortIdentity *info) {
     auto size = static_cast<u32>(std::strlen(status.clientName) + 1);
     if (size > info->clientRoom) {
-        std::free(info->clientName);
-        info->clientName = static_cast<char *>(AllocOrPanic(size, "Client Name"));
-        info->clientRoom = size;
+        GrowName(size, info);
     }
-    std::memcpy(info->clientName, status.clientName, size);
+    if (size <= info->clientRoom) {
+        std::memcpy(info->clientName, status.clientName, size);
+    }
     info->statusFlags = status.statusFlags;
     info->rxMode = status.rxMode;
 }
@@ -102,6 +114,8 @@ void KeepInfo(const PortInfo &from, PortIdentity *info) {
     info->switchName = static_cast<char *>(AllocOrPanic(size, "Switch Name"));
     std::memcpy(info->switchName, from.type.switchName, size);
     std::memcpy(info->macText, from.macText, sizeof info->macText);
+    info->clientRoom = static_cast<u32>(std::strlen(from.status.clientName) + 1);
+    info->clientName = static_cast<char *>(AllocOrPanic(info->clientRoom, "Client Name"));
     KeepStatus(from.status, info);
 }
 

@@ -5,7 +5,8 @@
 // second signal every few milliseconds until the process is gone, and its handler, which does nothing, has no
 // SA_RESTART: a call that blocks, on a terminal, a pipe or a file that the user named, returns with EINTR the next time
 // it comes, also a call that was about to block when the wish was noted. So every blocking call may stand alone,
-// without a poll ahead of it. A write to the kernel is the exception: the timer rests while it goes on.
+// without a poll ahead of it. A write to the kernel is the exception: the timer rests while it goes on, and one that
+// never returned could not be ended. The process has one thread; another would get some of the signals.
 //
 // In replay nothing of this is installed, and the signals have their default action.
 #pragma once
