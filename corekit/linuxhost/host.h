@@ -84,6 +84,7 @@ struct LinuxHost {
     NetlinkSocket notices;
     LinkTable links;
     bool loaded = false;
+    bool stale = false;  // notices were lost, and the table was not read anew yet
     u64 lookedAt = 0;
 
     u32 change = 1;           // of links, guests or addresses
@@ -117,6 +118,7 @@ struct LinuxHost {
     Pass stackPass{};
     u32 stackServed[STACK_RECORDS] = {};
     TcpSockets sockets;
+    TcpTotals tcp{};  // as last told
 
     bool threadsOpen = false;
     Threads threads{};
@@ -125,6 +127,7 @@ struct LinuxHost {
 
     bool toldNetlink = false;  // what was said once
     bool toldQueues = false;
+    bool toldSockets = false;
     bool toldCpus = false;
 };
 

@@ -23,7 +23,7 @@ void KeepCounters(void *context, u32 index, const LinkCounters &counters) {
 bool DumpPays(const LinuxHost &host) {
     const Pass &pass = host.counting;
     u64 wanted = pass.generation <= 1 ? host.ports.size() : pass.expected;
-    return std::max<u64>(wanted, pass.reads) * DUMP_SHARE > host.links.rows.size();
+    return std::max<u64>(wanted, pass.reads) * DUMP_SHARE > host.members.size();
 }
 
 Outcome FillCounters(LinuxHost *host, u32 index, Port *port) {
@@ -35,6 +35,12 @@ Outcome FillCounters(LinuxHost *host, u32 index, Port *port) {
         return FINE;
     }
     Outcome outcome = CountersRead(&host->route, index, &port->counters);
+    if (outcome != FINE && outcome != GONE) {
+        outcome = CountersRead(&host->route, index, &port->counters);
+    }
+    if (outcome != FINE && outcome != GONE && port->filled != 0) {
+        return FINE;  // as last told: a port that fails once is lost for good
+    }
     port->filled = outcome == FINE ? host->counting.generation : port->filled;
     return outcome;
 }

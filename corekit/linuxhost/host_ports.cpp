@@ -92,6 +92,9 @@ void JoinLinks(LinuxHost *host) {
         host->change++;
         FindLowers(host);
         FindSwitches(host);
+        if (host->links.overflown) {
+            TellOnce(&host->toldNetlink, "corekit: more than %u interfaces: those beyond are left out\n", LINKS_MAX);
+        }
     }
 }
 
@@ -184,8 +187,10 @@ Outcome HostLinks(LinuxHost *host) {
         NetlinkOpen(&host->notices, NETLINK_ROUTE, LINK_NOTICES);
         outcome = LoadLinks(host);
         host->loaded = outcome == FINE;
-    } else if (host->notices.io.receive == nullptr || LinksNotices(&host->notices, &host->links) == INTERRUPTED) {
-        outcome = LoadLinks(host);
+    } else {
+        bool deaf = host->notices.io.receive == nullptr;
+        host->stale |= deaf || LinksNotices(&host->notices, &host->links) == INTERRUPTED;
+        host->stale = host->stale && LoadLinks(host) != FINE;  // until then the table serves as it is
     }
     JoinLinks(host);
     return outcome;

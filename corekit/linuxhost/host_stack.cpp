@@ -87,19 +87,25 @@ KnfStatus Ipv6Get(LinuxHost *host, const Params & /*keys*/, char *record) {
     return status;
 }
 
-// No counter of the host tells bytes; its sockets do. Where they may not be asked, bytes stay 0: the rest of the record
-// is measured all the same.
+// No counter of the host tells bytes; its sockets do. Where they may not be asked, bytes stay what they were, 0 at
+// first: the rest of the record is measured all the same, and a total must not step back.
 KnfStatus TcpGet(LinuxHost *host, const Params & /*keys*/, char *record) {
     KnfStatus status = Fill(host, STACK_TCP, TCP_FIELDS, record);
     const StackRow &row = host->stack.row;
     Put(record, tcp::TX_ACK_ONLY, StackValue(row, TCP_OUT_SEGMENTS) - StackValue(row, TCP_DATA_SENT));
-    TcpTotals totals = {};
-    if (status == STATUS_OK && TcpSocketsRead(&host->sockets, &totals) == FINE) {
-        Put(record, tcp::TX_DATA_BYTES, totals.bytesSent);
-        Put(record, tcp::RX_DATA_BYTES, totals.bytesReceived);
-        Put(record, tcp::RX_DATA_SEGMENTS, totals.segmentsReceived);
+    if (status != STATUS_OK) {
+        return status;
     }
-    return status;
+    TcpTotals totals = {};
+    if (TcpSocketsRead(&host->sockets, &totals) == FINE) {
+        host->tcp = totals;
+    } else {
+        TellOnce(&host->toldSockets, "corekit: the kernel does not tell the bytes of its TCP connections\n");
+    }
+    Put(record, tcp::TX_DATA_BYTES, host->tcp.bytesSent);
+    Put(record, tcp::RX_DATA_BYTES, host->tcp.bytesReceived);
+    Put(record, tcp::RX_DATA_SEGMENTS, host->tcp.segmentsReceived);
+    return STATUS_OK;
 }
 
 // What a full socket lost is among the errors, too.

@@ -134,7 +134,7 @@ KnfStatus VcpuMigrationsGet(LinuxHost *host, const Params &keys, char *record) {
     const ThreadRow *row = nullptr;
     Outcome outcome = ReadVcpu(host, keys[0].number, THREAD_MOVES, &row);
     if (outcome == FINE) {
-        Put(record, vcpu_migrations::COUNT, (row->known & THREAD_MIGRATIONS) != 0 ? row->migrations : 0);
+        Put(record, vcpu_migrations::COUNT, row->migrations);
     }
     return StatusOf(outcome);
 }
@@ -183,8 +183,9 @@ KnfStatus WorldletGet(LinuxHost *host, const Params &keys, char *record) {
     Put(record, AFFINE_PCPU, (row->known & THREAD_AFFINITY) != 0 ? row->affinity : NO_CPU);
     Put(record, AFFINE_WORLDLET, NO_WORLDLET);
     Put(record, RUNS, row->runs);
-    Put(record, MIGRATIONS, (row->known & THREAD_MIGRATIONS) != 0 ? row->migrations : 0);
-    Put(record, REMOTE_ACTS, (row->known & THREAD_REMOTE_WAKEUPS) != 0 ? row->remoteWakeups : 0);
+    // What can't be read once stays as it was, 0 at first: a total must not step back.
+    Put(record, MIGRATIONS, row->migrations);
+    Put(record, REMOTE_ACTS, row->remoteWakeups);
     Put(record, USED, row->run);
     Put(record, READY, row->ready);
     Put(record, WAIT, row->life - std::min(row->life, row->run + row->ready));

@@ -84,7 +84,7 @@ const KeyRow KEY_ROWS[] = {
     {"ports.ipv6.rxeps", EXACT, "errors of headers, addresses and protocols, discards", FEATURE_IPV6, ZERO},
     {"ports.ipv6.rxreass", EXACT, STACK6, FEATURE_IPV6, ZERO},
     {"ports.tcptx.pps", EXACT, "OutSegs and RetransSegs"},
-    {"ports.tcptx.datapct", EXACT, "TCPOrigDataSent and RetransSegs"},
+    {"ports.tcptx.datapct", CLOSE, "TCPOrigDataSent and RetransSegs; the end of a connection counts as data"},
     {"ports.tcptx.mbps", EXACT, SOCKETS, FEATURE_TCP_SOCKETS},
     {"ports.tcptx.size", EXACT, SOCKETS, FEATURE_TCP_SOCKETS},
     {"ports.tcptx.delackpct", CLOSE, "acknowledgements alone are taken as segments without data, SYN and FIN too"},

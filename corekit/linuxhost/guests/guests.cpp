@@ -9,6 +9,7 @@
 #include <map>
 #include <memory>
 #include <sys/stat.h>
+#include <sys/sysmacros.h>
 #include <unistd.h>
 
 namespace {
@@ -103,6 +104,20 @@ void TakeKernelThread(Scan *scan, u32 pid) {
     }
 }
 
+// Whether it is a device of the driver that /proc/devices names: a path may have been mounted over.
+bool IsMacvtap(Scan *scan, const struct stat &device) {
+    std::string_view text = scan->Text("devices");
+    while (S_ISCHR(device.st_mode) && !text.empty()) {
+        std::string_view line = ProcTakeLine(&text);
+        u64 number = 0;
+        if (ProcNumber(ProcTakeWord(&line), &number) && number == major(device.st_rdev) &&
+            ProcTakeWord(&line) == "macvtap") {
+            return true;
+        }
+    }
+    return false;
+}
+
 // The interface of a descriptor that leads to a tap; false for any other.
 bool TapOf(Scan *scan, const Process &process, u32 descriptor, HeldTap *tap) {
     char link[64];
@@ -123,7 +138,7 @@ bool TapOf(Scan *scan, const Process &process, u32 descriptor, HeldTap *tap) {
     u64 index = 0;
     struct stat device = {};
     if (!StartsWith(target, MACVTAP) || !ProcNumber(target.substr(MACVTAP.size()), &index) || index > 0xffffffff ||
-        (fstatat(scan->root.proc, path.c_str(), &device, 0) == 0 && !S_ISCHR(device.st_mode))) {
+        (fstatat(scan->root.proc, path.c_str(), &device, 0) == 0 && !IsMacvtap(scan, device))) {
         return false;
     }
     tap->index = static_cast<u32>(index);

@@ -145,7 +145,7 @@ Outcome StackRead(Stack *stack, u64 generation) {
     if (stack->generation == generation && stack->row.known != 0) {
         return FINE;
     }
-    StackRow row = {};
+    StackRow row = stack->row;  // a file that fails once keeps what it told: a total must not fall to 0
     Outcome outcome = GONE;
     for (ProcFile &file : stack->files) {
         std::string_view text;
