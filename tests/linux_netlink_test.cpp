@@ -166,6 +166,7 @@ TEST(LinuxNetlink, APortIsLostWhenItGoesMovesOrIsAnotherAndNotBefore) {
                             {"moved", {Told(7, "v0", "veth", 3)}, {}, true}, {"gone", {gone}, {}, true},
                             {"index used again", {gone + port}, {}, true},
                             {"lost notices", {""}, {{bridges + port, Done()}}, false},
+                            {"a refused reload", {""}, {{Message(NLMSG_ERROR, Bytes(-ENOBUFS))}}, false},
                             {"gone unseen", {""}, {{bridges, Done()}}, true},
                             {"left out of torn dumps", {""}, {{torn, Done()}, {torn, Done()}, {torn, Done()},
                              {torn, Done()}, {torn, Done()}, {Told(3, "br1", "bridge")}, {port}}, false},
@@ -200,5 +201,21 @@ TEST(LinuxNetlink, APassIsOneDumpAndTheNextOneIsAnother) {
         EXPECT_TRUE(sent[0] == unit && sent[1] == 3 * unit && sent[2] == 12 * unit) << step.after;
         EXPECT_TRUE(machine.route.answers.empty());
     }
+}
+
+TEST(LinuxNetlink, CountersThatAreRefusedStayAsTheyWereAndThoseOfWhatIsGoneFail) {
+    Machine machine(Told(2, "v0", "veth") + Told(3, "v1", "veth"), {2, 3});
+    Params keys = {ParamOf(std::string(NO_SWITCH)), ParamOf(2)};
+    Strings refused = {Message(NLMSG_ERROR, Bytes(-ENOBUFS))};
+    std::string record, later;
+    machine.route.answers = {{Counted(2, 5) + Counted(3, 5), Done()}};
+    ASSERT_EQ(machine.Get(NODE_PORT_STATS, keys, &record), STATUS_OK);
+    Machine::clock += PASS_AGE;
+    machine.route.answers = {refused, refused, refused};
+    EXPECT_EQ(machine.Get(NODE_PORT_STATS, keys, &later), STATUS_OK);
+    EXPECT_EQ(later, record);
+    Machine::clock += PASS_AGE;
+    machine.route.answers = {{Counted(3, 6), Done()}, {Message(NLMSG_ERROR, Bytes(-ENODEV))}};
+    EXPECT_NE(machine.Get(NODE_PORT_STATS, keys), STATUS_OK);
 }
 // clang-format on

@@ -95,6 +95,9 @@ TEST_F(Tree, CountersOfTheStackAreFoundByKey) {
     EXPECT_EQ(std::tuple(StackValue(stack.row, IP4_IN), StackValue(stack.row, TCP_OUT_SEGMENTS)),
               std::tuple(70000000000, 12));
     EXPECT_EQ(__builtin_popcountll(stack.row.known), 6) << "what is missing or no number is not known";
+    Put("net/snmp", "");
+    ASSERT_EQ(StackRead(&stack, 2), FINE);
+    EXPECT_EQ(StackValue(stack.row, IP4_IN), 70000000000) << "a file that fails once made a total fall to 0";
     StackClose(&stack);
 }
 
