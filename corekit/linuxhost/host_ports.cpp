@@ -238,7 +238,10 @@ const Link *HostPort(LinuxHost *host, const Params &keys) {
         return nullptr;
     }
     const Link *link = LinkOf(host, keys[1].number);
-    auto found = link != nullptr ? host->ports.find(link->index) : host->ports.end();
+    if (link == nullptr) {
+        return nullptr;
+    }
+    auto found = host->ports.find(link->index);
     if (found == host->ports.end() || found->second.birth != link->birth) {
         return nullptr;
     }
