@@ -242,7 +242,7 @@ TEST(Driver, SignalCutsNoWriteToTheKernel) {
 TEST(Driver, HandlersThatCannotBeInstalledAreToldOnceAndTheRunGoesOn) {
     for (const char *fault : {"sigaction 1", "sigaction 2", "sigaction 3", "sigaction 5", "timer_create 1"}) {
         std::string script = "LIBC_FAULT='" + std::string(fault) + "' $METER-libc-faults -p 7 -i 1 >out 2>err";
-        MeterRun run = RunScript(HOST, script, {"", true});
+        MeterRun run = RunScript(HOST, script);
         EXPECT_EQ(run.status, 0) << fault;
         EXPECT_EQ(run.err,
                   "Log0: Error Registering SIGINT Signal Handler\nLog0: If you histograms, you should either:\n"
