@@ -11,6 +11,7 @@
 #include <signal.h>
 #include <string>
 #include <sys/resource.h>
+#include <thread>
 #include <unistd.h>
 
 namespace {
@@ -65,6 +66,22 @@ TEST(Report, TextLongerThanTheBufferGoesToStandardErrorAlone) {
     ReportPrintf(&pipe.report, "on it goes");
     ReportFlush(&pipe.report);
     EXPECT_EQ(pipe.Take(), "on it goes");
+}
+
+// As a pipe is that another program set so.
+TEST(Report, DescriptorThatSaysTryAgainIsWaitedFor) {
+    PipeReport pipe;
+    std::string filling(4096, 'f');
+    while (write(pipe.ends[1], filling.data(), filling.size()) > 0) {
+    }
+    std::thread reader([&pipe] {
+        usleep(50000);
+        while (pipe.Take().size() == 65536) {
+        }
+    });
+    ReportPrintf(&pipe.report, "late");
+    EXPECT_EQ(StderrOf([&pipe] { EXPECT_EQ(ReportFlush(&pipe.report), 0U); }), "");
+    reader.join();
 }
 
 // A file-size limit lets a part of a write through, as a disk that fills up does.
