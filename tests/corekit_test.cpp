@@ -1,12 +1,16 @@
 // The stand-in itself: what the other tests rest on.
 #include "corekit/entry/control.h"
 #include "interface/corekit.h"
+#include "interface/types.h"
 #include "tests/fixed_clock.h"
 #include "tests/run_meter.h"
 
+#include <bit>
+#include <cmath>
 #include <cstring>
 #include <gtest/gtest.h>
 #include <memory>
+#include <random>
 #include <string>
 #include <vector>
 
@@ -144,6 +148,18 @@ TEST(Corekit, FaultsFailTheCallsTheyName) {
     }
 }
 
+TEST(Corekit, FaultsOfAFileMeetEachSource) {
+    WriteRunFile("faults", "# of any host\nfault get 603 status=7\n");
+    WriteRunFile("bad", "\nfault gett\n");
+    MeterRun run = RunScript("", "${METER% *} " RECORD_BINARY " -o s -i 0 -n 1 >table; rm trace\n"
+                                 "for faults in faults bad; do for source in demo '' ' -c s.0'; do\n"
+                                 "  set -- ${source#demo}; ${METER%%demo*}${source%% *} COREKIT_FAULTS=$faults"
+                                 " ${METER#*demo} -A $* -i 0 && echo passed; done; done >out 2>err");
+    EXPECT_EQ(Count(run.trace, "get 603 -> 0x7\n"), 3U);
+    EXPECT_EQ(Count(run.err, "bad:2: call \"gett\": expected get, list, "), 3U) << run.err;
+    EXPECT_EQ(run.out.find("passed"), std::string::npos);
+}
+
 TEST(Corekit, ErrorsInDescriptionsNameLineAndExpectation) {
     const std::vector<std::pair<const char *, const char *>> cases = {
         {"switch s\nswich t\n", "text:3: keyword \"swich\": expected host, pcpu"},
@@ -172,6 +188,36 @@ TEST(Corekit, ErrorsInDescriptionsNameLineAndExpectation) {
     EXPECT_EQ(HckSyscall_Init(1, 0, 0), 0);
     EXPECT_NE(CorekitRecorded().front(), "init -> 0x0");
     EXPECT_EQ(CorekitRecorded().back(), "init -> 0x0");
+}
+
+TEST(Corekit, FormatsEveryNumberAsTheCLibraryDoes) {
+    std::mt19937_64 random(1);
+    auto same = [&](const char *format, auto value) {
+        char ours[80] = {}, theirs[80] = {};
+        size_t size = random() % 8 == 0 ? random() % 12 : sizeof ours;  // that it does not fit, too
+        int length = snprintf(theirs, size, format, value);
+        EXPECT_EQ(Str_Snprintf(ours, size, format, value), static_cast<size_t>(length) < size ? length : -1);
+        EXPECT_EQ(memcmp(ours, theirs, sizeof ours), 0) << format << " " << value << ": " << ours << ", " << theirs;
+    };
+    for (int i = 0; i < 20000; i++) {
+        u64 bits = random() >> random() % 64;
+        double halves = static_cast<double>(static_cast<i64>(bits % 8000000) - 4000000) / (1 << random() % 12);
+        double any = std::bit_cast<double>(random()), number = random() % 2 == 0 ? halves : any;
+        number = std::abs(number) < 1e40 ? number : std::copysign(HUGE_VAL, number);
+        for (const char *format : {"%.0f", "%.1f;", "%6.2f", "%.3f%%", "%06.1f", "%f"}) {
+            same(format, number);
+        }
+        for (const char *format : {"%Ld", "%lu", "%5Ld", "%020Ld", "%-9Ld;"}) {
+            same(format, i % 2 == 0 ? bits : 0 - bits);
+        }
+        for (const char *format : {"%d", "%u", "%02x:", "%+d"}) {
+            same(format, static_cast<u32>(bits));
+        }
+    }
+    for (const char *text : {"", "twelve bytes", "%s"}) {
+        same("<%s>", text);
+        same("%4s", text);
+    }
 }
 
 // Every layout, offset, factor, rate and default of the simulated host in one figure, noise included. After a wanted

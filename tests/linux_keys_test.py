@@ -56,9 +56,9 @@ def told_here(name, here):
     """The worth of a key as the text for a host has it; "never there" when its section is not."""
     section, _, key = name.rpartition(".")
     section = re.sub(r"\.(topology|details)$", "", section) or "the record"
-    state = re.search(rf"^{re.escape(section)}: (not )?there", here, re.M)
+    state = re.search(rf"^{re.escape(section)}: (?:(not )?there|none now: )", here, re.M)
     assert state, f"{section} is not told"
-    line = re.search(rf"^  \S*{re.escape(key)} +(exact|close|zero|not measured) ", here.split(state[0])[1], re.M)
+    line = re.search(rf"^  \S*{re.escape(key)} +(exact|close|zero|not measured|by NIC) ", here.split(state[0])[1], re.M)
     assert state[1] or line, f"{name} is not told"
     return "never there" if state[1] else line[1]
 

@@ -6,9 +6,17 @@
 #include <algorithm>
 #include <array>
 #include <deque>
+#include <filesystem>
+#include <fstream>
 #include <gtest/gtest.h>
+#include <linux/ethtool_netlink.h>
+#include <linux/gen_stats.h>
+#include <linux/genetlink.h>
 #include <linux/if_link.h>
+#include <linux/pkt_sched.h>
 #include <linux/rtnetlink.h>
+#include <sys/resource.h>
+#include <sys/socket.h>
 
 namespace {
 
@@ -41,6 +49,13 @@ std::string Told(int index, const char *name, const char *kind, u32 master = 0, 
                        Attr(IFLA_LINKINFO, Attr(IFLA_INFO_KIND, kind)),
                    flags);
 }
+// A NIC, which has a parent device and no kind.
+std::string Card(int index, const char *name) {
+    ifinfomsg header = {};
+    header.ifi_index = index;
+    return Message(RTM_NEWLINK, Bytes(header) + Attr(IFLA_IFNAME, name) + Attr(IFLA_MTU, Bytes(1500)) +
+                                    Attr(IFLA_PARENT_DEV_NAME, "virtio0"));
+}
 Strings Torn() {
     return {Told(2, "br0", "bridge", 0, RTM_NEWLINK, NLM_F_DUMP_INTR), Done()};
 }
@@ -49,12 +64,32 @@ std::string Counted(u32 index, u64 unit) {
     return Message(RTM_NEWSTATS, Bytes(if_stats_msg{0, 0, 0, index, 0}) + Attr(IFLA_STATS_LINK_64, Bytes(stats)));
 }
 
+// Of the queue disciplines of a NIC the root "mq" and the one of each queue.
+std::string Queued(int index, const std::vector<u32> &packets) {
+    std::string all;
+    for (u32 i = 0; i <= packets.size(); i++) {
+        tcmsg header = {};
+        header.tcm_ifindex = index;
+        header.tcm_handle = i == 0 ? 0x10000 : 0;
+        header.tcm_parent = i == 0 ? TC_H_ROOT : 0x10000 + i;
+        gnet_stats_basic basic = {100, i == 0 ? 0 : packets[i - 1]};
+        all += Message(RTM_NEWQDISC, Bytes(header) + Attr(TCA_KIND, i == 0 ? "mq" : "fq") +
+                                         Attr(TCA_STATS2, Attr(TCA_STATS_BASIC, Bytes(basic))));
+    }
+    return all;
+}
+
 // Answers each request by the next entry: datagrams, of which an empty one stands for some that were lost.
 struct Kernel {
     std::deque<Strings> answers;
     std::deque<std::string> waiting;
     u32 sequence = 0;
+    const char *driver = nullptr;  // of all interfaces
 
+    static bool Driver(void *context, const char *, char *driver) {
+        const char *name = static_cast<Kernel *>(context)->driver;
+        return name != nullptr && strcpy(driver, name) != nullptr;
+    }
     static ssize_t Send(void *context, const void *message, size_t size) {
         auto *kernel = static_cast<Kernel *>(context);
         if (kernel->answers.empty()) {
@@ -86,12 +121,13 @@ struct Kernel {
 
 struct Machine {
     inline static u64 clock = 1;
-    Kernel route, notices;
+    Kernel route, notices, generic;
     LinuxHost *host = LinuxHostOpen();
     Machine(const std::string &links, const std::vector<int> &ports) {
         host->now = [] { return clock; };
         host->route.io = {Kernel::Send, Kernel::Receive, &route};
         host->notices.io = {Kernel::Send, Kernel::Receive, &notices};
+        host->generic.io = {Kernel::Send, Kernel::Receive, &generic};
         route.answers = {{links, Done()}};
         for (int port : ports) {
             EXPECT_EQ(Get(NODE_PORT_TYPE, {ParamOf(port)}), STATUS_OK);
@@ -157,6 +193,65 @@ TEST(LinuxNetlink, ADumpIsBelievedOnlyWhenItsEndWasSeen) {
     }
 }
 
+TEST(LinuxNetlink, PortsOfABridgeHaveTheKindThatIsProven) {
+    auto veth = [](u8 family, int index, u32 master, u32 peer, bool foreign = false) {
+        ifinfomsg header = {};
+        header.ifi_family = family;
+        header.ifi_index = index;
+        return Message(RTM_NEWLINK, Bytes(header) + Attr(IFLA_IFNAME, "v") + Attr(IFLA_MTU, Bytes(1500)) +
+                                        Attr(IFLA_MASTER, Bytes(master)) + Attr(IFLA_LINK, Bytes(peer)) +
+                                        (foreign ? Attr(IFLA_LINK_NETNSID, Bytes(0)) : "") +
+                                        (family == 0 ? Attr(IFLA_LINKINFO, Attr(IFLA_INFO_KIND, "veth")) : ""));
+    };
+    // Ports 11 to 74 of a bridge, of which 11 has the peer 5; 6 says the same of 12, but means another namespace.
+    std::string others = Told(2, "br0", "bridge") + veth(0, 5, 0, 11) + veth(0, 6, 0, 12, true), indices, ports, news;
+    for (int i = 2; i < 75; i++) {
+        indices += i == 2 || i == 5 || i == 6 || i > 10 ? Counted(static_cast<u32>(i), 0) : "";
+        ports += i > 10 ? veth(AF_BRIDGE, i, 2, i < 13 ? static_cast<u32>(i) - 6 : 5) : "";
+    }
+    for (u32 i = 100; i < 120; i++) {
+        news += Counted(i, 0);
+    }
+    Strings list = {indices, Done()}, many = {indices + news, Done()}, longer = {indices + Counted(80, 0), Done()}, brief = {ports, Done()}, rest = {others, Done()};
+    Strings whole = {Told(11, "v", "veth", 2) + Told(12, "t", "tun", 2), Done()}, torn = {Torn()[0], Done()};
+    struct Case { const char *what; std::deque<Strings> answers; const char *driver; LinkKind kind; size_t links; };
+    for (const Case &one : {Case{"taps", {list, brief, rest}, "tun", KIND_TAP, 67},
+                            {"veths", {list, brief, rest}, "veth", KIND_VETH, 67},
+                            {"on a bond", {longer, brief, rest, {Told(80, "e", "", 5)}}, "tun", KIND_TAP, 68},
+                            {"gone", {longer, brief, rest, {Message(NLMSG_ERROR, Bytes(-ENODEV))}}, "tun", KIND_TAP, 67},
+                            {"other drivers", {list, brief, rest, whole}, "vxlan", KIND_TAP, 2},
+                            {"no driver", {list, brief, rest, whole}, nullptr, KIND_TAP, 2},
+                            {"an old kernel", {many, brief, {Done()}, whole}, "veth", KIND_TAP, 2},
+                            {"torn", {list, brief, torn, whole}, "veth", KIND_TAP, 2}}) {
+        Kernel kernel{one.answers, {}, 0, one.driver};
+        NetlinkSocket socket;
+        LinkTable table;
+        socket.io = {Kernel::Send, Kernel::Receive, &kernel, Kernel::Driver};
+        NetlinkOpen(&socket, 0);
+        EXPECT_EQ(LinksLoad(&socket, &table), FINE) << one.what;
+        EXPECT_TRUE(kernel.answers.empty()) << one.what;
+        EXPECT_EQ(table.rows.size(), one.links) << one.what;
+        EXPECT_EQ(LinksFind(table, 11)->kind, KIND_VETH) << one.what;
+        EXPECT_EQ(LinksFind(table, 12)->kind, one.kind) << one.what;
+    }
+}
+
+TEST(LinuxNetlink, LinksThatAreGoneLeaveTheTable) {
+    Kernel kernel;
+    NetlinkSocket notices;
+    LinkTable table;
+    notices.io = {Kernel::Send, Kernel::Receive, &kernel};
+    NetlinkOpen(&notices, 0);
+    for (int i = 1; i < 2000; i++) {
+        std::string text = Told(i, "v", "veth");
+        kernel.waiting = {i % 100 == 0 ? text : text + Told(i, "v", "veth", 0, RTM_DELLINK)};
+        EXPECT_EQ(LinksNotices(&notices, &table), FINE);
+        EXPECT_LT(table.rows.size(), 40U);
+    }
+    EXPECT_NE(LinksFind(table, 100), nullptr);
+    EXPECT_EQ(LinksFind(table, 1999), nullptr);
+}
+
 TEST(LinuxNetlink, APortIsLostWhenItGoesMovesOrIsAnotherAndNotBefore) {
     std::string bridges = Told(2, "br0", "bridge") + Told(3, "br1", "bridge");
     auto torn = [](const std::string &alone) {  // the answers until a port is asked for alone
@@ -170,7 +265,9 @@ TEST(LinuxNetlink, APortIsLostWhenItGoesMovesOrIsAnotherAndNotBefore) {
                             {"lost notices", {""}, {{bridges + port, Done()}}, false},
                             {"a refused reload", {""}, {{Message(NLMSG_ERROR, Bytes(-ENOBUFS))}}, false},
                             {"gone unseen", {""}, {{bridges, Done()}}, true},
+                            {"of another kind", {""}, {{bridges + Told(7, "v0", "dummy", 2), Done()}}, true},
                             {"left out of torn dumps", {""}, torn(port), false},
+                            {"moved in torn dumps", {""}, torn(Told(7, "v0", "veth", 3)), true},
                             {"gone in torn dumps", {""}, torn(Message(NLMSG_ERROR, Bytes(-ENODEV))), true}}) {
         Machine machine(bridges + port, {7});
         Machine::clock += NOTICE_LOOK;
@@ -179,6 +276,29 @@ TEST(LinuxNetlink, APortIsLostWhenItGoesMovesOrIsAnotherAndNotBefore) {
         KnfStatus status = machine.Get(NODE_PORT_STATUS, {ParamOf(std::string("br0")), ParamOf(7)});
         EXPECT_EQ(status != STATUS_OK, one.lost) << one.what;
         EXPECT_TRUE(machine.route.answers.empty()) << one.what;
+    }
+}
+
+TEST(LinuxNetlink, ANicWhoseParentIsNotToldIsOneWhereSysShowsItself) {
+    std::filesystem::path top = testing::TempDir() + "sys-" + std::to_string(getpid());
+    for (const char *index : {"4", "5"}) {  // the second one is of another namespace
+        std::filesystem::create_directories(top / "class/net/eth0");
+        std::ofstream(top / "class/net/eth0/ifindex") << index << "\n";
+        std::ofstream(top / "class/net/eth0/address") << "02:00:00:00:00:04\n";
+        std::filesystem::create_symlink("../../../0000:00:03.0", top / "class/net/eth0/device");
+        Machine machine("", {});
+        ProcRootClose(&machine.host->root);
+        ProcRootOpen(&machine.host->root, top.c_str(), top.c_str());
+        machine.route.answers = {{Told(4, "eth0", ""), Done()}, {Counted(4, 1), Done()}};
+        std::string type, device;
+        ASSERT_EQ(machine.Get(NODE_PORT_TYPE, {ParamOf(4)}, &type), STATUS_OK);
+        machine.notices.waiting = {Told(4, "eth0", "")};
+        Machine::clock += NOTICE_LOOK;
+        KnfStatus status = machine.Get(NODE_NIC_PROPERTIES, {ParamOf(std::string("eth0"))}, &device);
+        EXPECT_EQ(std::pair(type[0] == 4, type[0] == 2), std::pair(*index == '4', *index != '4'));
+        EXPECT_EQ(status == STATUS_OK, *index == '4');
+        EXPECT_EQ(device.find("0000:00:03.0") != std::string::npos, *index == '4');
+        std::filesystem::remove_all(top);
     }
 }
 
@@ -204,6 +324,39 @@ TEST(LinuxNetlink, APassIsOneDumpAndTheNextOneIsAnother) {
     }
 }
 
+TEST(LinuxNetlink, AQueueThatBeginsAgainGoesOnAndOneThatIsAwayFails) {
+    Machine machine(Card(4, "eth0"), {});
+    Params keys = {ParamOf(std::string("eth0"))};
+    machine.route.answers = {{Card(4, "eth0"), Done()}};
+    rlimit files = {}, none = {};
+    getrlimit(RLIMIT_NOFILE, &files);
+    none.rlim_max = files.rlim_max;
+    setrlimit(RLIMIT_NOFILE, &none);
+    std::string record;
+    machine.host->generic.io = {};
+    EXPECT_EQ(machine.Get(NODE_TXQ_INFO, keys, &record), STATUS_OK) << "no socket for queues";
+    EXPECT_EQ(record[0], 0);
+    setrlimit(RLIMIT_NOFILE, &files);
+    machine.host->generic.io = {Kernel::Send, Kernel::Receive, &machine.generic};
+    Machine::clock += PASS_AGE;
+    machine.generic.answers = {{Message(NLMSG_ERROR, Bytes(-ENOENT))},
+                               {Message(GENL_ID_CTRL, "    " + Attr(CTRL_ATTR_FAMILY_ID, Bytes(u16{30})))},
+                               {Message(30, "    " + Attr(ETHTOOL_A_CHANNELS_COMBINED_COUNT, Bytes(2)))}};
+    machine.route.answers = {{Queued(4, {50, 60}), Done()}};
+    ASSERT_EQ(machine.Get(NODE_TXQ_INFO, keys, &record), STATUS_OK);
+    EXPECT_EQ(record[0], 2);
+    keys.push_back(ParamOf(1));
+    struct Step { std::vector<u32> told; u32 shown; };  // of the second queue; 0: it fails
+    for (const Step &step : {Step{{50, 60}, 60}, {{51}, 0}, {{52, 7}, 67}, {{53, 9}, 69}, {{1, 1}, 70}}) {
+        Machine::clock += PASS_AGE;
+        machine.route.answers = {{Queued(4, step.told), Done()}};
+        EXPECT_EQ(machine.Get(NODE_TXQ_STATS, keys, &record) == STATUS_OK, step.shown != 0);
+        u32 packets = 0;
+        memcpy(&packets, &record[txq_stats::PKTS.offset], sizeof packets);
+        EXPECT_EQ(packets, step.shown);
+    }
+}
+
 TEST(LinuxNetlink, CountersThatAreRefusedStayAsTheyWereAndThoseOfWhatIsGoneFail) {
     Machine machine(Told(2, "v0", "veth") + Told(3, "v1", "veth"), {2, 3});
     Params keys = {ParamOf(std::string(NO_SWITCH)), ParamOf(2)};
@@ -218,5 +371,22 @@ TEST(LinuxNetlink, CountersThatAreRefusedStayAsTheyWereAndThoseOfWhatIsGoneFail)
     Machine::clock += PASS_AGE;
     machine.route.answers = {{Counted(3, 6), Done()}, {Message(NLMSG_ERROR, Bytes(-ENODEV))}};
     EXPECT_NE(machine.Get(NODE_PORT_STATS, keys), STATUS_OK);
+}
+
+TEST(LinuxNetlink, CountsThatBeginAgainAreOfAnotherInterfaceWhenNoticesWereLost) {
+    std::string links = Told(2, "v0", "veth") + Told(3, "v1", "veth");
+    for (bool lost : {false, true}) {
+        Machine machine(links, {2});
+        Params keys = {ParamOf(std::string(NO_SWITCH)), ParamOf(2)};
+        machine.route.answers = {{Counted(2, 5), Done()}};
+        ASSERT_EQ(machine.Get(NODE_PORT_STATS, keys), STATUS_OK);
+        Machine::clock += PASS_AGE;
+        machine.notices.waiting = lost ? std::deque<std::string>{""} : std::deque<std::string>{};
+        machine.route.answers = {{Counted(2, 4), Done()}};
+        if (lost) {
+            machine.route.answers.push_front({links, Done()});
+        }
+        EXPECT_EQ(machine.Get(NODE_PORT_STATS, keys) == STATUS_OK, !lost);
+    }
 }
 // clang-format on

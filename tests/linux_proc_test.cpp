@@ -102,12 +102,12 @@ TEST_F(Tree, CountersOfTheStackAreFoundByKey) {
 TEST_F(Tree, NamesOfThreadsPassForNoFigure) {
     Put("sys/kernel/sched_schedstats", "1\n");
     const std::string stat = "8 (a) S 1 1) R 1 1 1 0 -1 0 0 0 0 0 0 0 0 0 20 0 1 0 ";
-    Put("7/task/8/schedstat", "5000000 600 70\n");
     Put("7/task/8/status", "Name:\tCpus_allowed_list:\t1\nCpus_allowed_list:\t4\n");
     Put("7/task/8/sched", "\nnr_migrations : 3 (8, #threads: 1)\nse.nr_migrations : 4\n" + std::string(40, '-') +
                               "\nse.nr_migrations   :   41\nnr_wakeups_remote : 42\nnr_switches : 43\n");
     for (u32 kept : {9U, 1U, 0U}) {  // the rest is opened by each read, and a thread known by its start
         ProcLimitKept(kept);
+        Put("7/task/8/schedstat", "5000000 600 70\n");
         Put("7/task/8/stat", stat + "250 0 0\n");
         Threads threads;
         const ThreadRow *row = nullptr;
@@ -117,13 +117,16 @@ TEST_F(Tree, NamesOfThreadsPassForNoFigure) {
         EXPECT_EQ(std::tuple(row->known, row->run, row->ready, row->runs), std::tuple(15, 5000000, 600, 70));
         EXPECT_EQ(std::tuple(row->migrations, row->remoteWakeups, row->affinity), std::tuple(41, 42, 4));
         EXPECT_EQ(ThreadWatch(&threads, 7, 9, 15), GONE);
+        Put("7/task/8/schedstat", "0 0 0\n");
+        ASSERT_EQ(ThreadRead(&threads, 8, 3, &row), FINE);
+        EXPECT_EQ(row->known & THREAD_TIMES, 0) << "a kernel that does not account";
         Put("7/task/8/stat", stat + "251 0 0\n");
         EXPECT_EQ(ThreadRead(&threads, 8, 2, &row), kept == 0 ? GONE : FINE) << "a later thread of this number";
         ThreadsClose(&threads);
     }
     ProcBuffer buffer;
     std::string_view text;
-    EXPECT_EQ(ProcReadOnce(root.proc, "7/task/8/schedstat", 14, &buffer, &text), BROKEN) << "never cut";
+    EXPECT_EQ(ProcReadOnce(root.proc, "7/task/8/schedstat", 5, &buffer, &text), BROKEN) << "never cut";
     EXPECT_EQ(text, "");
 }
 
@@ -180,4 +183,51 @@ TEST_F(Tree, OnlyWhoHoldsATapIsBelieved) {
     ASSERT_TRUE(tap != nullptr && GuestsFind(guests, "tap1", 0) != nullptr && GuestsFind(guests, "tap2", 0) == nullptr);
     EXPECT_EQ(std::tuple(tap->guest, tap->macTold, tap->mac[5], GuestsFind(guests, "tap1", 0)->mac[5]),
               std::tuple(1, true, 0xff, 0x66));
+}
+
+TEST_F(Tree, ATapIsOfWhoLooksMostLikeAGuestAndOfNobodyWhereTwoDo) {
+    Strings one = {"x", "-name", "one"}, two = {"x", "-name", "two"},
+            card = {"x", "-nic", "tap,ifname=d,mac=2:0:0:0:0:1"};
+    struct Holder {
+        const char *tap;
+        Strings arguments, threads;
+    };
+    u32 pid = 40;
+    for (const Holder &holder : {Holder{"a", {}, {}},
+                                 {"a", one, {}},
+                                 {"a", {}, {}},
+                                 {"b", one, {}},
+                                 {"b", two, {}},
+                                 {"c", one, {}},
+                                 {"c", one, {}},
+                                 {"d", card, {}},
+                                 {"d", one, {}},
+                                 {"d", one, {}},
+                                 {"e", one, {"CPU 0/KVM"}},
+                                 {"e", one, {"CPU 0/KVM"}},
+                                 {"f", one, {}},
+                                 {"f", {}, {"CPU 0/KVM"}},
+                                 {"g", {}, {}},
+                                 {"g", {}, {}}}) {
+        PutProcess(std::to_string(pid++), "x", 0, {holder.tap}, holder.arguments, holder.threads);
+    }
+    Guests guests;
+    ASSERT_EQ(GuestsScan(root, &guests), FINE);
+    std::vector<u32> holders;
+    for (const HeldTap &tap : guests.taps) {
+        holders.push_back(tap.guest == NO_GUEST ? 0 : guests.guests[tap.guest].pid);
+    }
+    EXPECT_EQ(holders, (std::vector<u32>{41, 0, 45, 0, 0, 53, 54}));
+    EXPECT_EQ(guests.crowded, 0U);
+    std::filesystem::path many =
+        "/dev/shm/descriptors-" + std::to_string(getpid());  // in memory, as it is slow on disks
+    std::filesystem::create_directory(many);
+    for (u32 i = 0; i <= MAX_DESCRIPTORS; i++) {
+        std::filesystem::create_symlink("/dev/null", many / std::to_string(i));
+    }
+    std::filesystem::create_directory(top / "60");
+    std::filesystem::create_directory_symlink(many, top / "60/fd");
+    ASSERT_EQ(GuestsScan(root, &guests), FINE);
+    EXPECT_EQ(guests.crowded, 60U);
+    std::filesystem::remove_all(many);
 }

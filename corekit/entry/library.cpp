@@ -1,6 +1,7 @@
 // The C entry points: argument checks, faults, counts and journal around the current source of nodes.
 #include "corekit/entry/control.h"
 #include "corekit/entry/faults.h"
+#include "corekit/entry/format.h"
 #include "corekit/entry/journal.h"
 #include "corekit/linuxhost/source.h"
 #include "corekit/node_source.h"
@@ -14,10 +15,10 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <fstream>
 #include <iterator>
 #include <memory>
 #include <new>
+#include <optional>
 #include <utility>
 
 namespace {
@@ -35,6 +36,7 @@ struct Library {
     const NodeSource *current = nullptr;  // what reads are served from; null while nothing is connected
     bool loadedByControl = false;
     std::vector<FaultRule> faults;
+    std::optional<bool> namedFaults;  // whether COREKIT_FAULTS could be used, once it was looked at
     uint64_t calls[CALL_KINDS] = {};
 };
 
@@ -81,18 +83,22 @@ Result Contained(Result failed, Body body) {
     }
 }
 
-KnfStatus AddParam(KnfParamList list, const KnfParamRec &param) {
+KnfStatus AddParam(KnfParamList list, KnfParamRec param) {
     KnfStatus status = CheckCall({CALL_ADD, 0, nullptr, &param});
     const NodeSource *source = Lib().current;
     if (status == STATUS_OK && source != nullptr && source->withoutHistograms && param.isText && list != nullptr &&
         list->kind == KNF_INPUT_LIST) {
         status = STATUS_NOT_WRITABLE;
     }
-    if (status == STATUS_OK) {
-        status = ParamListAdd(list, param);
-    }
+    Params told;
     if (JournalWanted(false)) {
-        Told(status, "add", nullptr, {param});
+        told = {param};
+    }
+    if (status == STATUS_OK) {
+        status = ParamListAdd(list, std::move(param));
+    }
+    if (!told.empty()) {
+        Told(status, "add", nullptr, told);
     }
     return status;
 }
@@ -129,15 +135,26 @@ void LoadMachine() {
     library.current = &library.live;
 }
 
+// A file that opens and can't be read, as a directory, is an empty one.
+bool ReadNamed(const char *path, const char *expected, std::string *text) {
+    FILE *file = fopen(path, "re");
+    if (file == nullptr) {
+        fprintf(stderr, "%s: %s: expected %s\n", path, strerror(errno), expected);
+        return false;
+    }
+    char piece[4096];
+    text->clear();
+    for (size_t length; (length = fread(piece, 1, sizeof piece, file)) > 0;) {
+        text->append(piece, length);
+    }
+    fclose(file);
+    return true;
+}
+
 bool LoadDescribed(const char *path) {
     std::string text = DefaultHostText();
-    if (strcmp(path, "demo") != 0) {
-        std::ifstream file(path);
-        if (!file) {
-            fprintf(stderr, "%s: %s: expected a readable host description\n", path, strerror(errno));
-            return false;
-        }
-        text.assign(std::istreambuf_iterator<char>(file), {});
+    if (strcmp(path, "demo") != 0 && !ReadNamed(path, "a readable host description", &text)) {
+        return false;
     }
     std::string error;
     bool loaded = Load(text, path, &error);
@@ -157,6 +174,32 @@ bool LoadNamed() {
     return true;
 }
 
+bool AddFaults(const std::string &lines, const char *file, std::string *error) {
+    std::vector<FaultRule> added;
+    bool valid = DescriptionFaults(
+        lines, file, [&added](Line *line) { FaultsTake(line, &added); }, error);
+    if (valid) {
+        Lib().faults.insert(Lib().faults.end(), added.begin(), added.end());
+    }
+    return valid;
+}
+
+// Faults of a file, for whatever source connects. One that can't be used connects none, so that no test passes for want
+// of its faults.
+bool AddNamedFaults() {
+    const char *path = getenv("COREKIT_FAULTS");
+    std::optional<bool> *usable = &Lib().namedFaults;
+    if (!usable->has_value() && path != nullptr && *path != 0) {
+        std::string text;
+        std::string error;
+        *usable = ReadNamed(path, "a readable file of faults", &text) && AddFaults(text, path, &error);
+        if (!error.empty()) {
+            fprintf(stderr, "%s\n", error.c_str());
+        }
+    }
+    return usable->value_or(true);
+}
+
 }  // namespace
 
 extern "C" {
@@ -165,6 +208,11 @@ int HckSyscall_Init(int, int, int) {
     return Contained(-1, [&] {
         Library &library = Lib();
         bool connected = library.loadedByControl || LoadNamed();
+        if (connected && !AddNamedFaults()) {
+            connected = false;
+            library.live = {};
+            library.current = nullptr;
+        }
         Told(connected ? STATUS_OK : STATUS_NOT_CONNECTED, "init", nullptr, {});
         return connected ? 0 : -1;
     });
@@ -306,7 +354,7 @@ KnfStatus KNF_UseCache(const char *path, uint32_t) {
         std::string name = path != nullptr ? path : "";
         library.current = nullptr;
         library.snapshot = std::make_unique<Snapshot>();
-        KnfStatus status = SnapshotOpen(name.c_str(), library.snapshot.get());
+        KnfStatus status = AddNamedFaults() ? SnapshotOpen(name.c_str(), library.snapshot.get()) : STATUS_NOT_CONNECTED;
         if (status == STATUS_OK) {
             library.cache = SnapshotSource(library.snapshot.get());
             library.current = &library.cache;
@@ -326,7 +374,7 @@ KnfStatus KNF_CacheCleanup(void) {
 }
 
 int Str_Vsnprintf(char *buffer, size_t size, const char *format, va_list arguments) {
-    int length = vsnprintf(buffer, size, format, arguments);  // NOLINT(clang-analyzer-valist.Uninitialized): callers'
+    int length = FormatText(buffer, size, format, arguments);  // NOLINT(clang-analyzer-valist.Uninitialized): callers'
     return length >= 0 && static_cast<size_t>(length) < size ? length : -1;
 }
 
@@ -354,13 +402,8 @@ void CorekitUnload() {
 }
 
 bool CorekitFault(const std::string &lines, std::string *error) {
-    std::vector<FaultRule> added;
     std::string problem;
-    bool valid = DescriptionFaults(
-        lines, "fault", [&added](Line *line) { FaultsTake(line, &added); }, &problem);
-    if (valid) {
-        Lib().faults.insert(Lib().faults.end(), added.begin(), added.end());
-    }
+    bool valid = AddFaults(lines, "fault", &problem);
     if (error != nullptr) {
         *error = problem;
     }

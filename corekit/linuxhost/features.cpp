@@ -1,27 +1,18 @@
 #include "corekit/linuxhost/features.h"
 
-#include "corekit/linuxhost/proc/cpu.h"
+#include "corekit/linuxhost/host.h"
+#include "corekit/linuxhost/netlink/counters.h"
+#include "corekit/linuxhost/source.h"
 
 #include <algorithm>
-#include <cstring>
-#include <dirent.h>
 #include <fcntl.h>
-#include <linux/genetlink.h>
-#include <linux/if_link.h>
 #include <linux/netlink.h>
-#include <linux/perf_event.h>
-#include <linux/rtnetlink.h>
-#include <sys/socket.h>
-#include <sys/stat.h>
-#include <sys/syscall.h>
+#include <net/if.h>
 #include <unistd.h>
 
 namespace {
 
-constexpr u32 LIMIT = 65536;
-constexpr char NETDEV_FAMILY[] = "netdev";
-constexpr u32 NETDEV_QUEUE_GET = 10;   // 6.8
-constexpr u32 NETDEV_QSTATS_GET = 12;  // 6.9
+constexpr u32 LOOPBACK = 1;  // index of the first interface, which is lo in each namespace
 
 Answer OfOutcome(Outcome outcome) {
     return outcome == FINE                               ? ANSWER_YES
@@ -30,222 +21,94 @@ Answer OfOutcome(Outcome outcome) {
                                                          : ANSWER_NO;
 }
 
-struct Text {
-    ProcBuffer buffer{};
-    std::string_view text{};
-    Outcome outcome;
-    Text(const ProcRoot &root, const char *path) { outcome = ProcReadOnce(root.proc, path, LIMIT, &buffer, &text); }
-};
-
-// Processes that hidepid hides look as if they did not exist; the first one always does.
-Answer AskProcesses(const ProcRoot &root) {
-    bool any = Text(root, "self/comm").outcome == FINE;
-    Outcome first = Text(root, "1/comm").outcome;
-    return first == FINE ? ANSWER_YES : any ? ANSWER_NOT_ALLOWED : ANSWER_NO;
+Answer AskProcesses(LinuxHost *host) {
+    return HostScan(host) != FINE || host->guests.processes == 0 ? ANSWER_NO
+           : host->guests.hidden                                 ? ANSWER_NOT_ALLOWED
+                                                                 : ANSWER_YES;
 }
 
-// Asked of processes of other users; where there are none, nobody is refused. The first process of all may be guarded
-// better than the rest.
-Answer AskTapHolders(const ProcRoot &root) {
-    if (Answer seen = AskProcesses(root); seen != ANSWER_YES) {
-        return seen;
+Answer AskTapHolders(LinuxHost *host) {
+    Answer seen = AskProcesses(host);
+    return seen == ANSWER_YES && host->guests.refused != 0 ? ANSWER_NOT_ALLOWED : seen;
+}
+
+Answer AskCpuTimes(LinuxHost *host) {
+    return HostTopology(host) == nullptr ? ANSWER_NO : OfOutcome(CpusRead(&host->cpus, 1));
+}
+
+// A thread of another user, as a guest's may be; our own where those are hidden.
+const Thread *Sample(LinuxHost *host) {
+    if (!host->threadsOpen && ThreadsOpen(&host->threads, &host->root, true) != FINE) {
+        return nullptr;
     }
-    Answer answer = ANSWER_YES;
-    int descriptor = openat(root.proc, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    DIR *processes = descriptor >= 0 ? fdopendir(descriptor) : nullptr;
-    while (const dirent *entry = processes != nullptr ? readdir(processes) : nullptr) {
-        u64 pid = 0;
-        struct stat owner = {};
-        if (!ProcNumber(entry->d_name, &pid) || fstatat(root.proc, entry->d_name, &owner, 0) != 0 ||
-            owner.st_uid == geteuid()) {
-            continue;
+    host->threadsOpen = true;
+    for (u32 id : {u32{1}, static_cast<u32>(getpid())}) {
+        const ThreadRow *row = nullptr;
+        u32 wanted = THREAD_TIMES | THREAD_MIGRATIONS | THREAD_REMOTE_WAKEUPS;
+        if (ThreadWatch(&host->threads, id, id, wanted) == FINE && ThreadRead(&host->threads, id, 1, &row) == FINE) {
+            return &host->threads.open[id];
         }
-        if (fstatat(root.proc, (std::string(entry->d_name) + "/ns/net").c_str(), &owner, 0) == 0) {
-            answer = ANSWER_YES;
-            break;
-        }
-        answer = errno == EACCES || errno == EPERM ? ANSWER_NOT_ALLOWED : answer;
     }
-    if (processes != nullptr) {
-        closedir(processes);
-    }
-    return answer;
+    return nullptr;
 }
 
-// A kernel that does not account shows three zeros. We have run at least once, though a young thread's time may be 0.
-Answer AskSchedstat(const ProcRoot &root) {
-    Text file(root, "thread-self/schedstat");
-    bool counted = file.text.find_first_of("123456789") != std::string_view::npos;
-    return AskProcesses(root) == ANSWER_NO    ? ANSWER_CANT_TELL
-           : file.outcome == FINE && !counted ? ANSWER_NO
-                                              : OfOutcome(file.outcome);
+Answer AskThread(LinuxHost *host, u32 figure) {
+    const Thread *thread = Sample(host);
+    return thread == nullptr ? ANSWER_CANT_TELL : (thread->row.known & figure) != 0 ? ANSWER_YES : ANSWER_NO;
 }
 
-Answer AskPerf(const ProcRoot &) {
-    perf_event_attr attributes = {};
-    attributes.size = sizeof attributes;
-    attributes.type = PERF_TYPE_SOFTWARE;
-    attributes.config = PERF_COUNT_SW_CPU_MIGRATIONS;
-    long descriptor = syscall(SYS_perf_event_open, &attributes, 1, -1, -1, PERF_FLAG_FD_CLOEXEC);
-    int error = descriptor < 0 ? errno : 0;
-    if (descriptor >= 0) {
-        close(static_cast<int>(descriptor));
-    }
-    return error == ESRCH ? ANSWER_CANT_TELL : OfOutcome(ErrnoOutcome(error));
+Answer AskSchedstat(LinuxHost *host) {
+    return AskThread(host, THREAD_TIMES);
 }
 
-// In text, else by an event.
-Answer AskMigrations(const ProcRoot &root) {
-    Text file(root, "thread-self/sched");
-    return file.text.find("nr_migrations") != std::string_view::npos ? ANSWER_YES : AskPerf(root);
+Answer AskMigrations(LinuxHost *host) {
+    return AskThread(host, THREAD_MIGRATIONS);
 }
 
-Answer AskRemoteWakeups(const ProcRoot &root) {
-    Text file(root, "sys/kernel/sched_schedstats");
-    return file.outcome == FINE && file.text.substr(0, 1) == "1" ? ANSWER_YES : ANSWER_NO;
+Answer AskPerf(LinuxHost *host) {
+    const Thread *thread = Sample(host);
+    return thread == nullptr ? ANSWER_CANT_TELL : thread->perf >= 0 ? ANSWER_YES : ANSWER_NOT_ALLOWED;
+}
+
+Answer AskRemoteWakeups(LinuxHost *host) {
+    return AskThread(host, THREAD_REMOTE_WAKEUPS);
 }
 
 // CPUs that are off tell of no cache.
-Answer AskOneCache(const ProcRoot &root) {
-    Cpus cpus;
+Answer AskOneCache(LinuxHost *host) {
+    const CpuTopology *topology = HostTopology(host);
     u32 first = NO_CPU;
     bool one = true;
-    if (CpusOpen(&cpus, root) == FINE) {
-        for (u32 cache : cpus.topology.lastCache) {
-            one = one && (cache == NO_CPU || first == NO_CPU || cache == first);
-            first = cache != NO_CPU ? cache : first;
-        }
+    for (u32 cache : topology != nullptr ? topology->lastCache : std::vector<u32>()) {
+        one = one && (cache == NO_CPU || first == NO_CPU || cache == first);
+        first = cache != NO_CPU ? cache : first;
     }
-    CpusClose(&cpus);
     return first == NO_CPU ? ANSWER_CANT_TELL : one ? ANSWER_YES : ANSWER_NO;
 }
 
-// A request of one question, and the answer to it. The kernel answers before send returns.
-struct Question {
-    alignas(nlmsghdr) char request[256] = {};
-    alignas(nlmsghdr) char reply[16384] = {};
-
-    nlmsghdr *Header() { return reinterpret_cast<nlmsghdr *>(request); }
-    void Append(const void *data, size_t size) {
-        memcpy(request + Header()->nlmsg_len, data, size);
-        Header()->nlmsg_len += static_cast<u32>(NLMSG_ALIGN(size));
-    }
-    Question(u16 type, const void *head, size_t size) {
-        *Header() = {NLMSG_HDRLEN, type, NLM_F_REQUEST, 1, 0};
-        Append(head, size);
-    }
-    // The bytes of the reply, its header first; or what it says instead.
-    Outcome Ask(int protocol, std::string_view *answer) {
-        int descriptor = socket(AF_NETLINK, SOCK_RAW | SOCK_CLOEXEC, protocol);
-        if (descriptor < 0) {
-            return ErrnoOutcome(errno);
-        }
-        sockaddr_nl kernel = {};
-        kernel.nl_family = AF_NETLINK;
-        ssize_t got = sendto(descriptor, request, Header()->nlmsg_len, 0, reinterpret_cast<sockaddr *>(&kernel),
-                             sizeof kernel) < 0
-                          ? -1
-                          : recv(descriptor, reply, sizeof reply, MSG_DONTWAIT);
-        int error = got < 0 ? errno : 0;
-        close(descriptor);
-        auto *header = reinterpret_cast<nlmsghdr *>(reply);
-        if (error == 0 && (static_cast<size_t>(got) < sizeof *header || header->nlmsg_len > static_cast<size_t>(got) ||
-                           header->nlmsg_len < NLMSG_HDRLEN)) {
-            error = EIO;
-        }
-        if (error == 0 && header->nlmsg_type == NLMSG_ERROR) {
-            int code = 0;
-            if (header->nlmsg_len >= NLMSG_HDRLEN + sizeof code) {
-                memcpy(&code, reply + NLMSG_HDRLEN, sizeof code);
-            }
-            error = code < 0 ? -code : EIO;
-        }
-        *answer = error == 0 ? std::string_view(reply, header->nlmsg_len) : std::string_view();
-        return ErrnoOutcome(error);
-    }
-};
-
-// Of the first interface, which is lo in each namespace.
-Answer AskLinkCounters(const ProcRoot &) {
-    if_stats_msg message = {};
-    message.ifindex = 1;
-    message.filter_mask = IFLA_STATS_FILTER_BIT(IFLA_STATS_LINK_64);
-    std::string_view answer;
-    return OfOutcome(Question(RTM_GETSTATS, &message, sizeof message).Ask(NETLINK_ROUTE, &answer));
+Answer AskLinkCounters(LinuxHost *host) {
+    LinkCounters counters;
+    Outcome outcome = HostLinks(host);
+    return OfOutcome(outcome == FINE ? CountersRead(&host->route, LOOPBACK, &counters) : outcome);
 }
 
-struct Attribute {
-    u32 type = 0;
-    std::string_view payload{};
-};
-
-bool TakeAttribute(std::string_view *rest, Attribute *attribute) {
-    nlattr head = {};
-    if (rest->size() < sizeof head) {
-        return false;
-    }
-    memcpy(&head, rest->data(), sizeof head);
-    if (head.nla_len < NLA_HDRLEN || head.nla_len > rest->size()) {
-        return false;
-    }
-    *attribute = {head.nla_type & static_cast<u32>(NLA_TYPE_MASK),
-                  rest->substr(NLA_HDRLEN, head.nla_len - static_cast<size_t>(NLA_HDRLEN))};
-    rest->remove_prefix(std::min(rest->size(), static_cast<size_t>(NLA_ALIGN(head.nla_len))));
-    return true;
+// To ask makes a kernel with modules load one, which a report does and this does not: it is asked when it is there.
+Answer AskTcpSockets(LinuxHost *host) {
+    TcpTotals totals;
+    Outcome outcome = NetlinkOpen(&host->sockets.requests, NETLINK_SOCK_DIAG);
+    bool loads = faccessat(host->root.sys, "module/tcp_diag", F_OK, 0) != 0 &&
+                 faccessat(host->root.proc, "modules", F_OK, 0) == 0;
+    return outcome == FINE && loads ? ANSWER_CANT_TELL
+                                    : OfOutcome(outcome == FINE ? TcpSocketsRead(&host->sockets, &totals) : outcome);
 }
 
-// The family lists its operations.
-Answer AskOperation(u32 operation) {
-    genlmsghdr message = {CTRL_CMD_GETFAMILY, 1, 0};
-    nlattr name = {NLA_HDRLEN + sizeof NETDEV_FAMILY, CTRL_ATTR_FAMILY_NAME};
-    Question question(GENL_ID_CTRL, &message, sizeof message);
-    question.Append(&name, sizeof name);
-    question.Append(NETDEV_FAMILY, sizeof NETDEV_FAMILY);
-    std::string_view answer;
-    Outcome outcome = question.Ask(NETLINK_GENERIC, &answer);
-    if (outcome != FINE) {
-        return OfOutcome(outcome);
-    }
-    answer.remove_prefix(std::min(answer.size(), size_t{NLMSG_HDRLEN + GENL_HDRLEN}));
-    Attribute attribute;
-    while (TakeAttribute(&answer, &attribute)) {
-        Attribute entry;
-        while (attribute.type == CTRL_ATTR_OPS && TakeAttribute(&attribute.payload, &entry)) {
-            Attribute field;
-            u32 id = 0;
-            while (TakeAttribute(&entry.payload, &field)) {
-                if (field.type == CTRL_ATTR_OP_ID && field.payload.size() == sizeof id) {
-                    memcpy(&id, field.payload.data(), sizeof id);
-                }
-            }
-            if (id == operation) {
-                return ANSWER_YES;
-            }
-        }
-    }
-    return ANSWER_NO;
+bool OpenStack(LinuxHost *host) {
+    host->stackOpen = host->stackOpen || StackOpen(&host->stack, host->root) == FINE;
+    return host->stackOpen && StackRead(&host->stack, 1) == FINE;
 }
 
-Answer AskQueues(const ProcRoot &) {
-    return AskOperation(NETDEV_QUEUE_GET);
-}
-
-Answer AskQueueCounters(const ProcRoot &) {
-    return AskOperation(NETDEV_QSTATS_GET);
-}
-
-// A question would make the kernel load a module, so this looks only whether it is there already.
-Answer AskTcpSockets(const ProcRoot &root) {
-    int descriptor = socket(AF_NETLINK, SOCK_RAW | SOCK_CLOEXEC, NETLINK_SOCK_DIAG);
-    if (descriptor < 0) {
-        return OfOutcome(ErrnoOutcome(errno));
-    }
-    close(descriptor);
-    return faccessat(root.sys, "module/tcp_diag", F_OK, 0) == 0 ? ANSWER_YES : ANSWER_CANT_TELL;
-}
-
-Answer AskIpv6(const ProcRoot &root) {
-    return OfOutcome(Text(root, "net/snmp6").outcome);
+Answer AskIpv6(LinuxHost *host) {
+    return OpenStack(host) && StackKnows(host->stack.row, IP6_IN) ? ANSWER_YES : ANSWER_NO;
 }
 
 // clang-format off
@@ -256,6 +119,9 @@ constexpr Feature TABLE[] = {
     {"holders of taps", "", AskTapHolders,
      "guests of this user alone; other taps are plain ports with the name of the interface, without vcpus",
      "root, or CAP_SYS_PTRACE and CAP_DAC_READ_SEARCH"},
+    {"times of CPUs", "", AskCpuTimes,
+     "0, which nobody measured",
+     "/proc"},
     {"times of threads", "", AskSchedstat,
      "no vcpus and no worldlets",
      "a kernel with CONFIG_SCHED_INFO"},
@@ -274,11 +140,21 @@ constexpr Feature TABLE[] = {
     {"link counters alone", "4.7", AskLinkCounters,
      "no counters of interfaces, and so no port that can be watched",
      "a newer kernel"},
-    {"queues of NICs", "6.8", AskQueues,
-     "the count of channels that the driver tells",
-     "a newer kernel"},
-    {"counters of queues", "6.9", AskQueueCounters,
-     "counters of the NIC's queue disciplines, or of the NIC where it has one queue",
+    {"packets of the wire", "", nullptr,
+     "packets as the host of this virtual machine takes and hands them: one may stand for many on the wire",
+     "a NIC that is no virtual one"},
+    {"queues of NICs", "6.8", nullptr,
+     "the channels that the driver tells; else one queue of each kind is taken for granted",
+     "a newer kernel, or a driver that tells its channels"},
+    {"counters of queues", "6.9", nullptr,
+     "counters of the NIC's queue disciplines, which count what they hand to the driver; else no queues",
+     "a newer kernel, and a driver that keeps them"},
+    {"errors of queues", "6.10", nullptr,
+     "drops of the NIC's queue disciplines; 0, which nobody measured, where the driver counts the packets of its queues "
+     "but not their drops",
+     "a newer kernel, and a driver that keeps them"},
+    {"stops of queues", "6.10", nullptr,
+     "0, which nobody measured",
      "a newer kernel, and a driver that keeps them"},
     {"TCP sockets", "4.19", AskTcpSockets,
      "no counts of TCP bytes and of received data segments",
@@ -290,11 +166,72 @@ constexpr Feature TABLE[] = {
 // clang-format on
 static_assert(sizeof TABLE / sizeof *TABLE == FEATURES);
 
-constexpr int UNASKED = -1;
-struct Answers {
-    int known[FEATURES];
-    Answers() { std::fill(std::begin(known), std::end(known), UNASKED); }
-} answers;
+Outcome GetRecord(LinuxHost *host, u32 node, const Params &keys) {
+    std::vector<char> record(NodeRecordSize(node));
+    NodeSource source = LinuxHostSource(host);
+    return source.get(host, node, keys, record.data(), static_cast<u32>(record.size())) == STATUS_OK ? FINE : GONE;
+}
+
+// What all transmit queues tell, once the source has read them as for a report.
+u32 KnownOfQueues(LinuxHost *host, const Nic &nic) {
+    u32 known = nic.count.transmit != 0 ? ~0U : 0;
+    for (u32 queue = 0; queue < nic.count.transmit; queue++) {
+        bool read = GetRecord(host, NODE_TXQ_STATS, {ParamOf(nic.name), ParamOf(int64_t{queue})}) == FINE;
+        bool only = nic.source == QUEUES_UNTOLD;
+        bool there = read && (only || queue < nic.queues.size());  // the name may be another NIC's by now
+        known &= !there ? 0 : only ? u32{QUEUE_PACKETS | QUEUE_ERRORS} : nic.queues[queue].known;
+    }
+    return known;
+}
+
+bool OnWire(LinuxHost *host, const Nic &nic) {
+    const Link *link = LinksFind(host->links, nic.hardware);
+    constexpr const char *VIRTUAL[] = {"virtio", "xen", "vmbus"};
+    return link != nullptr && std::none_of(std::begin(VIRTUAL), std::end(VIRTUAL),
+                                           [link](const char *bus) { return strcmp(link->bus, bus) == 0; });
+}
+
+void TellNic(LinuxHost *host, const Link &link, HostTold *told) {
+    if (GetRecord(host, NODE_TXQ_INFO, {ParamOf(std::string(link.name))}) != FINE) {
+        return;
+    }
+    const Nic *nic = nullptr;  // the last one of this index, which each read may add to
+    for (const auto &one : host->nics) {
+        nic = one->index == link.index ? one.get() : nic;
+    }
+    if (nic != nullptr) {
+        u32 known = KnownOfQueues(host, *nic);
+        told->nics.push_back({nic->name, nic->count, nic->counted, nic->source, known, OnWire(host, *nic)});
+    }
+}
+
+// Whether a thread bears the name of an interface, and not that of one whose name goes on with digits.
+bool Bears(const std::string &thread, const char *name) {
+    size_t at = thread.find(name);
+    size_t end = at != std::string::npos ? at + strlen(name) : 0;
+    return at != std::string::npos && (end == thread.size() || thread[end] < '0' || thread[end] > '9');
+}
+
+void TellPort(LinuxHost *host, const Link &link, HostTold *told) {
+    i64 type = HostJoin(host, link)->type;
+    told->ports += (link.flags & IFF_LOOPBACK) == 0 ? 1 : 0;
+    told->stacks += type == PORT_HOST_STACK && OpenStack(host) ? 1 : 0;
+    for (const WorkerThread &thread : host->guests.nics) {
+        bool serves = type == PORT_UPLINK || type == PORT_HOST_STACK;
+        told->worldlets += serves && Bears(thread.name, link.name) ? 1 : 0;
+    }
+    if (type == PORT_UPLINK) {
+        TellNic(host, link, told);
+    }
+}
+
+void TellGuests(LinuxHost *host, HostTold *told) {
+    HostScan(host);
+    told->guests = host->guests;
+    for (const Guest &guest : told->guests.guests) {
+        told->worldlets += guest.vcpus.empty() ? 0 : static_cast<u32>(guest.vhost.size());
+    }
+}
 
 }  // namespace
 
@@ -302,15 +239,42 @@ const Feature &FeatureOf(FeatureId id) {
     return TABLE[id];
 }
 
-Answer FeatureAsk(const ProcRoot &root, FeatureId id) {
-    if (answers.known[id] == UNASKED) {
-        answers.known[id] = TABLE[id].ask(root);
-    }
-    return static_cast<Answer>(answers.known[id]);
+bool FeatureOfNics(FeatureId id) {
+    return id >= FEATURE_WIRE_PACKETS && id <= FEATURE_QUEUE_STOPS;
 }
 
-void FeatureForce(FeatureId id, Answer answer) {
-    answers.known[id] = answer;
+Served NicServed(const NicTold &nic, FeatureId id) {
+    bool close = nic.source == QUEUES_DISCIPLINES;
+    u32 figure = id == FEATURE_QUEUE_COUNTERS ? QUEUE_PACKETS : id == FEATURE_QUEUE_ERRORS ? QUEUE_ERRORS : QUEUE_STOPS;
+    if (id == FEATURE_WIRE_PACKETS) {
+        return nic.wire ? SERVED : SERVED_CLOSE;
+    }
+    if (id == FEATURE_QUEUES) {
+        return nic.counted ? SERVED : SERVED_CLOSE;
+    }
+    return (nic.known & figure) == 0 ? SERVED_NOT : close ? SERVED_CLOSE : SERVED;
+}
+
+void FeaturesAsk(LinuxHost *host, HostTold *told) {
+    *told = HostTold();
+    host->toldQueues = true;  // told below, NIC by NIC
+    host->toldNetlink = true;
+    TellGuests(host, told);
+    for (u32 id = 0; id < FEATURES; id++) {
+        told->answers[id] = TABLE[id].ask != nullptr ? TABLE[id].ask(host) : ANSWER_CANT_TELL;
+    }
+    const std::vector<Link> links = host->links.rows;  // to ask for a NIC takes in what changed, and moves the rows
+    for (const Link &link : links) {
+        if (!link.gone) {
+            TellPort(host, link, told);
+        }
+    }
+    for (u32 id = FEATURE_WIRE_PACKETS; id <= FEATURE_QUEUE_STOPS && !told->nics.empty(); id++) {
+        bool all = std::all_of(told->nics.begin(), told->nics.end(), [id](const NicTold &nic) {
+            return NicServed(nic, static_cast<FeatureId>(id)) == SERVED;
+        });
+        told->answers[id] = all ? ANSWER_YES : ANSWER_NO;
+    }
 }
 
 const char *AnswerText(Answer answer) {

@@ -3,12 +3,10 @@
 // and what went fails.
 #pragma once
 
-#include "corekit/linuxhost/guests/guests.h"
+#include "corekit/linuxhost/host_rows.h"
 #include "corekit/linuxhost/netlink/links.h"
 #include "corekit/linuxhost/netlink/neighbours.h"
-#include "corekit/linuxhost/netlink/queues.h"
 #include "corekit/linuxhost/netlink/sockets.h"
-#include "corekit/linuxhost/pass.h"
 #include "corekit/linuxhost/proc/cpu.h"
 #include "corekit/linuxhost/proc/stack.h"
 #include "corekit/linuxhost/proc/thread.h"
@@ -24,56 +22,9 @@ constexpr u64 NOTICE_LOOK = 5000000;  // ns between two looks for changed interf
 // The switch of interfaces that are on none. No interface can bear this name, and it is one word of a file.
 constexpr char NO_SWITCH[] = "no/switch";
 
-// An interface that was asked for.
-struct Port {
-    u32 birth = 0;        // of the link that its type was told of; 0: not told yet
-    u32 switchIndex = 0;  // then; 0: on none
-    char switchName[NAME_SIZE] = {};
-    u32 joined = 0;  // the state of the host that `type` and `tap` are of
-    i64 type = 0;
-    const HeldTap *tap = nullptr;  // of the host's guests; null unless a process holds it
-    u32 scan = 0;                  // that `tap` is of, and the link
-    u32 tapBirth = 0;
-    LinkCounters counters{};
-    u32 filled = 0;     // generation of the counters
-    u32 served = 0;     // as a port
-    u32 servedNic = 0;  // as a NIC
-};
-
-// A NIC that was asked for, by the name it bore then.
-struct Nic {
-    char name[NAME_SIZE] = {};
-    u32 index = 0;  // of the interface
-    u32 birth = 0;
-    u32 hardware = 0;  // of the NIC itself: another one for a VLAN
-    Pass counting{};
-    u32 countServed[2] = {};
-    QueueCount count{};
-    bool chosen = false;
-    QueueSource source = QUEUES_UNTOLD;
-    Pass reading{};
-    std::vector<QueueCounters> queues;
-    std::vector<u32> queueServed;
-};
-
-struct SwitchEntry {
-    u32 index;  // of the bridge or lower device; 0 for interfaces on none
-    char name[NAME_SIZE];
-};
-
-struct Member {
-    u32 switchIndex;
-    u32 index;
-};
-
-// The four records of the IP stack.
-enum StackRecord : u8 { STACK_IPV4, STACK_IPV6, STACK_TCP, STACK_UDP, STACK_RECORDS };
-
-// A thread that is read by several nodes: one look serves them all.
-struct ThreadUse {
-    Pass pass{};
-    u32 served[4] = {};
-};
+// Open vSwitch has one datapath for all its bridges. A port to the host's stack, as each bridge has one, doesn't name
+// it as its master, as all others do.
+constexpr char DATAPATH[] = "ovs-system";
 
 struct LinuxHost {
     u64 (*now)() = nullptr;  // ns, never back; a test's own
@@ -84,12 +35,16 @@ struct LinuxHost {
     NetlinkSocket notices;
     LinkTable links;
     bool loaded = false;
-    bool stale = false;  // notices were lost, and the table was not read anew yet
+    bool stale = false;      // notices were lost, and the table was not read anew yet
+    u32 reloads = 0;         // of the table, after notices were lost
+    bool sysIsOurs = false;  // /sys is known to show our network namespace
+    u64 clock = 0;           // when the present read began
     u64 lookedAt = 0;
 
     u32 change = 1;           // of links, guests or addresses
     u32 linkChange = 0;       // of the table, as far as `members` goes
     std::vector<u32> lowers;  // interfaces that a macvlan or macvtap stands on, ascending
+    u32 datapath = 0;         // index of DATAPATH; 0: none
     std::vector<SwitchEntry> switches;
     std::vector<Member> members;            // ascending by switch, then index
     std::unordered_set<std::string> shown;  // names of switches that were listed, or asked for
@@ -102,9 +57,11 @@ struct LinuxHost {
     bool neighboured = false;
     std::vector<Learned> learned;
 
-    std::unordered_map<u32, Port> ports;
+    std::unordered_map<u32, Port> ports;  // none ever leaves
+    Port *read = nullptr;                 // the one that was last looked for by a read
+    Port *dumped = nullptr;               // and by a dump
     Pass counting{};
-    bool dumped = false;  // the counters of this generation are of a dump
+    bool whole = false;  // the counters of this generation are of a dump
     std::vector<std::unique_ptr<Nic>> nics;
     Families families{};
 
@@ -122,13 +79,16 @@ struct LinuxHost {
 
     bool threadsOpen = false;
     Threads threads{};
-    std::unordered_map<u32, ThreadUse> uses;
+    std::unordered_map<u32, ThreadUse> uses;                // none ever leaves
+    ThreadUse *use = nullptr;                               // the last one
     std::unordered_map<std::string, WorkerThread> workers;  // by the name of the worldlet
 
     bool toldNetlink = false;  // what was said once
     bool toldQueues = false;
     bool toldSockets = false;
     bool toldCpus = false;
+    bool toldCrowd = false;
+    bool toldTap = false;
 };
 
 // Writing records, which are all zeros before.
@@ -144,11 +104,38 @@ Outcome HostLinks(LinuxHost *host);
 // New lists from here on: guests and addresses are looked for again when they are needed.
 void HostForget(LinuxHost *host);
 Outcome HostScan(LinuxHost *host);
+// An interface that was asked for; null when it was not. Reads and dumps come in the same order each time, so the one
+// that followed `*last` before is looked at first.
+inline Port *HostFind(LinuxHost *host, u32 index, Port **last, Port *Port::*next) {
+    Port *guess = *last != nullptr && (*last)->index != index ? (*last)->*next : *last;
+    if (guess == nullptr || guess->index != index) {
+        auto found = host->ports.find(index);
+        if (found == host->ports.end()) {
+            return nullptr;
+        }
+        guess = &found->second;
+        if (*last != nullptr) {
+            (*last)->*next = guess;
+        }
+    }
+    return *last = guess;
+}
+// The same for a read; made when it is not there.
+Port *HostPortOf(LinuxHost *host, u32 index);
 // Type, tap and switch of a link. The port of a link that was asked for keeps them while nothing changes.
 Port *HostJoin(LinuxHost *host, const Link &link);
 u32 HostSwitchOf(const LinuxHost &host, const Link &link);
 // The interface of these two keys, as long as it is on that switch; null when it went, moved, or is another one.
 const Link *HostPort(LinuxHost *host, const Params &keys);
+
+// host_sysfs.cpp. Marks each link by the number that /sys has for its interface, which keeps it through new names,
+// switches and namespaces and leaves it to no other. A link whose marked interface is no more is taken for another one.
+// Nothing happens where /sys is not known to show our network namespace.
+void HostMark(LinuxHost *host);
+void HostMarkOne(LinuxHost *host, Link *link);
+// The parent devices of NICs, which a kernel before 5.14 does not tell by netlink. Of an interface that /sys shows with
+// another index or address, nothing is believed.
+void HostFindParents(LinuxHost *host);
 
 // host_counters.cpp. The running counters of an interface, of a generation that `served` was not served from before.
 Outcome HostCounters(LinuxHost *host, u32 index, u32 Port::*served, const LinkCounters **counters);

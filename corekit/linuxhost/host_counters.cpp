@@ -10,12 +10,35 @@ namespace {
 
 constexpr u32 DUMP_SHARE = 8;  // a dump pays from one interface in so many on
 
-void KeepCounters(void *context, u32 index, const LinkCounters &counters) {
+bool BeganAgain(const LinkCounters &was, const LinkCounters &is) {
+    bool counted = false;
+    for (auto count :
+         {&LinkCounters::rxPackets, &LinkCounters::txPackets, &LinkCounters::rxBytes, &LinkCounters::txBytes}) {
+        if (was.*count != 0 && is.*count >= was.*count) {
+            return false;
+        }
+        counted = counted || was.*count != 0;
+    }
+    return counted;
+}
+
+// Where no mark tells interfaces apart, one whose counts all began again while notices were lost is another one of its
+// index. A NIC is left out, as its driver may begin again.
+void KeepCounters(LinuxHost *host, u32 index, Port *port, const LinkCounters &counters) {
+    bool doubtful = port->filled != 0 && port->reloads != host->reloads && BeganAgain(port->counters, counters);
+    Link *link = doubtful ? LinksFind(&host->links, index) : nullptr;
+    if (link != nullptr && link->mark == 0 && link->device[0] == 0) {
+        LinksRenew(&host->links, link);
+    }
+    port->reloads = host->reloads;
+    port->counters = counters;
+    port->filled = host->counting.generation;
+}
+
+void KeepDumped(void *context, u32 index, const LinkCounters &counters) {
     auto *host = static_cast<LinuxHost *>(context);
-    auto found = host->ports.find(index);
-    if (found != host->ports.end()) {
-        found->second.counters = counters;
-        found->second.filled = host->counting.generation;
+    if (Port *port = HostFind(host, index, &host->dumped, &Port::dumpNext)) {
+        KeepCounters(host, index, port, counters);
     }
 }
 
@@ -27,21 +50,25 @@ bool DumpPays(const LinuxHost &host) {
 }
 
 Outcome FillCounters(LinuxHost *host, u32 index, Port *port) {
-    if (!host->dumped && DumpPays(*host)) {
-        host->dumped = true;
-        CountersDump(&host->route, {KeepCounters, host});
+    if (!host->whole && DumpPays(*host)) {
+        host->whole = true;
+        CountersDump(&host->route, {KeepDumped, host});
+        host->counting.startedAt = host->now();
     }
     if (port->filled == host->counting.generation) {
         return FINE;
     }
-    Outcome outcome = CountersRead(&host->route, index, &port->counters);
+    LinkCounters counters = {};
+    Outcome outcome = CountersRead(&host->route, index, &counters);
     if (outcome != FINE && outcome != GONE) {
-        outcome = CountersRead(&host->route, index, &port->counters);
+        outcome = CountersRead(&host->route, index, &counters);
     }
     if (outcome != FINE && outcome != GONE && port->filled != 0) {
         return FINE;  // as last told: a port that fails once is lost for good
     }
-    port->filled = outcome == FINE ? host->counting.generation : port->filled;
+    if (outcome == FINE) {
+        KeepCounters(host, index, port, counters);
+    }
     return outcome;
 }
 
@@ -73,7 +100,7 @@ const Link *NicLink(LinuxHost *host, const std::string &name) {
 
 // The NIC that bore this name when it was first asked for; null when it went, or never was.
 Nic *NicOf(LinuxHost *host, const std::string &name) {
-    if (HostLinks(host) != FINE || NetlinkOpen(&host->generic, NETLINK_GENERIC) != FINE) {
+    if (HostLinks(host) != FINE) {
         return nullptr;
     }
     for (auto &nic : host->nics) {
@@ -108,7 +135,14 @@ void CountQueues(LinuxHost *host, Nic *nic, u32 direction) {
     if (!PassJoin(&nic->counting, &nic->countServed[direction], host->now())) {
         return;
     }
-    if (QueuesCount(&host->generic, &host->families, nic->hardware, &nic->count) != FINE) {
+    if (Outcome outcome = NetlinkOpen(&host->generic, NETLINK_GENERIC); outcome != FINE) {
+        nic->count = {};
+        TellOnce(&host->toldQueues, "corekit: the kernel does not tell the queues of NICs: %s\n",
+                 StatusText(StatusOf(outcome)));
+        return;
+    }
+    nic->counted = QueuesCount(&host->generic, &host->families, nic->hardware, &nic->count) == FINE;
+    if (!nic->counted) {
         nic->count = {1, 1};
     }
     if (!nic->chosen) {
@@ -119,11 +153,30 @@ void CountQueues(LinuxHost *host, Nic *nic, u32 direction) {
     }
 }
 
+// A queue may begin again when the number of queues changes: what it had counted until then stays in.
+void CarryQueues(Nic *nic) {
+    nic->told.resize(std::max(nic->told.size(), nic->queues.size()));
+    nic->before.resize(nic->told.size());
+    for (size_t i = 0; i < nic->queues.size(); i++) {
+        QueueCounters *queue = &nic->queues[i];
+        for (auto count : {&QueueCounters::packets, &QueueCounters::errors, &QueueCounters::stops}) {
+            u64 *told = &(nic->told[i].*count);
+            u64 *before = &(nic->before[i].*count);
+            if (queue->known != 0) {
+                *before += queue->*count < *told ? *told : 0;
+                *told = queue->*count;
+                queue->*count += *before;
+            }
+        }
+    }
+}
+
 Outcome ReadQueue(LinuxHost *host, Nic *nic, u32 queue, QueueCounters *counters) {
     nic->queueServed.resize(std::max<size_t>(nic->queueServed.size(), queue + 1));
     if (PassJoin(&nic->reading, &nic->queueServed[queue], host->now())) {
         NetlinkSocket *socket = nic->source == QUEUES_NETDEV ? &host->generic : &host->route;
         QueuesRead(socket, host->families, nic->source, nic->hardware, &nic->queues);
+        CarryQueues(nic);
     }
     if (queue >= nic->queues.size() || nic->queues[queue].known == 0) {
         return GONE;
@@ -167,9 +220,9 @@ std::string DeviceText(const LinuxHost &host, const Link &link) {
 }  // namespace
 
 Outcome HostCounters(LinuxHost *host, u32 index, u32 Port::*served, const LinkCounters **counters) {
-    Port *port = &host->ports[index];
-    if (PassJoin(&host->counting, &(port->*served), host->now())) {
-        host->dumped = false;
+    Port *port = HostPortOf(host, index);
+    if (PassJoin(&host->counting, &(port->*served), host->clock)) {
+        host->whole = false;
     }
     *counters = &port->counters;
     return port->filled == host->counting.generation ? FINE : FillCounters(host, index, port);
@@ -181,7 +234,11 @@ KnfStatus PortStatsGet(LinuxHost *host, const Params &keys, char *record) {
     if (link == nullptr) {
         return STATUS_NOT_FOUND;
     }
+    u32 birth = link->birth;
     Outcome outcome = HostCounters(host, link->index, &Port::served, &counters);
+    if (link->birth != birth) {
+        return STATUS_NOT_FOUND;
+    }
     if (outcome == FINE) {
         PutDirections(*counters, SeenFromOutside(*link), record);
     }

@@ -7,7 +7,8 @@
 
 namespace {
 
-constexpr int DEPTH = 8;  // of interfaces that belong to one another
+constexpr int DEPTH = 8;          // of interfaces that belong to one another
+constexpr u32 ADDRESS_SHARE = 8;  // a dump of addresses pays from one bridge in so many interfaces on
 constexpr i64 PORT_HIDDEN = 1;
 constexpr i64 PORT_PLAIN = 2;
 constexpr u64 RX_MODE_PROMISCUOUS = 1;
@@ -33,16 +34,23 @@ bool StandsOnSwitch(const Link &link) {
     return (link.kind == KIND_MACVLAN || link.kind == KIND_MACVTAP) && link.lower != 0;
 }
 
-bool IsSwitch(const Link &link) {
-    return link.kind == KIND_BRIDGE || (link.kind == KIND_SWITCH && link.master == 0);
+bool OnDatapath(const LinuxHost &host, const Link &link) {
+    return link.kind == KIND_SWITCH && host.datapath != 0 && link.index != host.datapath;
+}
+
+bool IsSwitch(const LinuxHost &host, const Link &link) {
+    return link.kind == KIND_BRIDGE || (link.kind == KIND_SWITCH && link.master == 0 && !OnDatapath(host, link));
 }
 
 u32 SwitchAbove(const LinuxHost &host, const Link &link, int depth) {
     const Link *master = link.master != 0 ? LinksFind(host.links, link.master) : nullptr;
     if (master != nullptr) {  // a member of a bond is where its bond is
-        return IsSwitch(*master) ? master->index : depth > 0 ? SwitchAbove(host, *master, depth - 1) : 0;
+        return IsSwitch(host, *master) ? master->index : depth > 0 ? SwitchAbove(host, *master, depth - 1) : 0;
     }
-    if (IsSwitch(link) || Contains(host.lowers, link.index)) {
+    if (OnDatapath(host, link)) {
+        return host.datapath;
+    }
+    if (IsSwitch(host, link) || Contains(host.lowers, link.index)) {
         return link.index;
     }
     return StandsOnSwitch(link) && LinksFind(host.links, link.lower) != nullptr ? link.lower : 0;
@@ -50,9 +58,13 @@ u32 SwitchAbove(const LinuxHost &host, const Link &link, int depth) {
 
 void FindLowers(LinuxHost *host) {
     host->lowers.clear();
+    host->datapath = 0;
     for (const Link &link : host->links.rows) {
         if (!link.gone && StandsOnSwitch(link)) {
             host->lowers.push_back(link.lower);
+        }
+        if (!link.gone && link.kind == KIND_SWITCH && strcmp(link.name, DATAPATH) == 0) {
+            host->datapath = link.index;
         }
     }
     std::sort(host->lowers.begin(), host->lowers.end());
@@ -73,7 +85,7 @@ void FindSwitches(LinuxHost *host) {
             continue;
         }
         host->members.push_back({HostSwitchOf(*host, link), link.index});
-        if (IsSwitch(link) || (Contains(host->lowers, link.index) && link.master == 0)) {
+        if (IsSwitch(*host, link) || (Contains(host->lowers, link.index) && link.master == 0)) {
             AddSwitch(host, link.index, link.name);
         }
     }
@@ -90,6 +102,7 @@ void JoinLinks(LinuxHost *host) {
     if (host->linkChange != host->links.change) {
         host->linkChange = host->links.change;
         host->change++;
+        HostFindParents(host);
         FindLowers(host);
         FindSwitches(host);
         if (host->links.overflown) {
@@ -98,11 +111,36 @@ void JoinLinks(LinuxHost *host) {
     }
 }
 
+bool IsBridge(const Link &link) {
+    return link.kind == KIND_BRIDGE || link.kind == KIND_SWITCH;
+}
+
+// Bridges alone are asked for: a dump takes a millisecond for 1,000 ports that may have no address at all.
+void LoadAddresses(LinuxHost *host) {
+    std::vector<u32> bridges;
+    for (const Link &link : host->links.rows) {
+        if (!link.gone && IsBridge(link)) {
+            bridges.push_back(link.index);
+        }
+    }
+    if (bridges.size() * ADDRESS_SHARE > host->links.rows.size()) {
+        bridges = {0};
+    }
+    host->addresses.clear();
+    for (u32 bridge : bridges) {
+        size_t before = host->addresses.size();
+        AddressesLoad(&host->route, bridge, &host->addresses);
+        if (host->addresses.size() > before && host->addresses.back() != bridge) {
+            break;  // of all interfaces, asked for or not
+        }
+    }
+    std::sort(host->addresses.begin(), host->addresses.end());
+}
+
 bool Addressed(LinuxHost *host, u32 index) {
     if (!host->addressed) {
         host->addressed = true;
-        host->addresses.clear();
-        AddressesLoad(&host->route, &host->addresses);
+        LoadAddresses(host);
     }
     return Contains(host->addresses, index);
 }
@@ -126,7 +164,7 @@ i64 TypeOf(LinuxHost *host, const Link &link, const HeldTap *tap) {
     if (tap != nullptr) {
         return PORT_VNIC;
     }
-    if (link.kind == KIND_BRIDGE || link.kind == KIND_SWITCH) {
+    if (IsBridge(link)) {
         return Addressed(host, link.index) ? PORT_HOST_STACK : PORT_PLAIN;
     }
     return IsNic(*host, link) ? PORT_UPLINK : PORT_PLAIN;
@@ -137,8 +175,8 @@ const char *SwitchName(const LinuxHost &host, u32 index) {
     return link != nullptr ? link->name : NO_SWITCH;
 }
 
-const Link *LinkOf(LinuxHost *host, int64_t index) {
-    return index > 0 && index <= UINT32_MAX ? LinksFind(host->links, static_cast<u32>(index)) : nullptr;
+Link *LinkOf(LinuxHost *host, int64_t index) {
+    return index > 0 && index <= UINT32_MAX ? LinksFind(&host->links, static_cast<u32>(index)) : nullptr;
 }
 
 const u8 *GuestMac(LinuxHost *host, const Link &link, const HeldTap &tap) {
@@ -167,31 +205,56 @@ u32 LeaderOf(const Guest &guest) {
 }
 
 void PutGuest(LinuxHost *host, const Link &link, const HeldTap &tap, char *record) {
-    const Guest &guest = host->guests.guests[tap.guest];
+    const Guest nobody = {};
+    const Guest &guest = tap.guest != NO_GUEST ? host->guests.guests[tap.guest] : nobody;
     PutText(record, port_status::CLIENT_NAME, guest.name.empty() ? link.name : guest.name.c_str());
     Put(record, port_status::WORLD_LEADER, LeaderOf(guest));
     PutMac(record, port_status::VNIC_MAC, GuestMac(host, link, tap));
 }
 
+// What of the guests could not be told.
+void TellScan(LinuxHost *host) {
+    const Guests &guests = host->guests;
+    if (guests.crowded != 0) {
+        TellOnce(&host->toldCrowd, "corekit: process %u has more than %u descriptors: taps beyond are not seen\n",
+                 guests.crowded, MAX_DESCRIPTORS);
+    }
+    auto tap =
+        std::find_if(guests.taps.begin(), guests.taps.end(), [](const HeldTap &one) { return one.guest == NO_GUEST; });
+    if (tap != guests.taps.end()) {
+        std::string name = tap->index != 0 ? "macvtap " + std::to_string(tap->index) : "";
+        if (tap->index == 0) {
+            ParamAppendText(&name, ParamOf(std::string(tap->name)));
+        }
+        TellOnce(&host->toldTap, "corekit: %s is held by several guests, and named after none of them\n", name.c_str());
+    }
+}
+
 }  // namespace
 
 Outcome HostLinks(LinuxHost *host) {
-    u64 now = host->now();
-    if (host->loaded && now - host->lookedAt < NOTICE_LOOK) {
+    host->clock = host->now();
+    if (host->loaded && host->clock - host->lookedAt < NOTICE_LOOK) {
         return FINE;
     }
-    host->lookedAt = now;
+    host->lookedAt = host->clock;
     Outcome outcome = FINE;
     if (!host->loaded) {
-        // Without notices the table stays as it is until the next list; what is gone is told by its counters.
+        // Without a socket for notices each look loads the table anew.
         NetlinkOpen(&host->notices, NETLINK_ROUTE, LINK_NOTICES);
         outcome = LoadLinks(host);
         host->loaded = outcome == FINE;
+        HostMark(host);
     } else {
         bool deaf = host->notices.io.receive == nullptr;
         host->stale |= deaf || LinksNotices(&host->notices, &host->links) == INTERRUPTED;
-        host->stale = host->stale && LoadLinks(host) != FINE;  // until then the table serves as it is
+        if (host->stale && LoadLinks(host) == FINE) {  // until then the table serves as it is
+            host->stale = false;
+            host->reloads++;
+            HostMark(host);
+        }
     }
+    host->clock = host->now();  // what follows must not look older than it is
     JoinLinks(host);
     return outcome;
 }
@@ -205,21 +268,32 @@ void HostForget(LinuxHost *host) {
 }
 
 Outcome HostScan(LinuxHost *host) {
-    if (!host->scanned) {
-        host->scanned = true;
-        host->scans++;
-        host->change++;
-        return GuestsScan(host->root, &host->guests);
+    if (host->scanned) {
+        return FINE;
     }
-    return FINE;
+    host->scanned = true;
+    host->scans++;
+    host->change++;
+    Outcome outcome = GuestsScan(host->root, &host->guests);
+    TellScan(host);
+    return outcome;
 }
 
 u32 HostSwitchOf(const LinuxHost &host, const Link &link) {
     return SwitchAbove(host, link, DEPTH);
 }
 
+Port *HostPortOf(LinuxHost *host, u32 index) {
+    Port *port = HostFind(host, index, &host->read, &Port::readNext);
+    if (port == nullptr) {
+        port = &host->ports[index];
+        port->index = index;
+    }
+    return port;
+}
+
 Port *HostJoin(LinuxHost *host, const Link &link) {
-    Port *port = &host->ports[link.index];
+    Port *port = HostPortOf(host, link.index);
     if (port->joined != host->change) {
         // Who holds a tap is told by its name, which is right at the moment of the scan and may change behind it.
         if (!host->scanned || port->scan != host->scans || port->tapBirth != link.birth) {
@@ -234,32 +308,35 @@ Port *HostJoin(LinuxHost *host, const Link &link) {
 }
 
 const Link *HostPort(LinuxHost *host, const Params &keys) {
-    if (HostLinks(host) != FINE) {
+    int64_t index = keys[1].number;
+    if (HostLinks(host) != FINE || index <= 0 || index > UINT32_MAX) {
         return nullptr;
     }
-    const Link *link = LinkOf(host, keys[1].number);
-    if (link == nullptr) {
+    Port *port = HostFind(host, static_cast<u32>(index), &host->read, &Port::readNext);
+    const Link *link = port != nullptr ? LinksFind(host->links, port->index, &port->row) : nullptr;
+    if (link == nullptr || port->birth != link->birth || strcmp(keys[0].text.c_str(), port->switchName) != 0) {
         return nullptr;
     }
-    auto found = host->ports.find(link->index);
-    if (found == host->ports.end() || found->second.birth != link->birth) {
-        return nullptr;
+    if (port->stayed != host->change) {
+        if (HostSwitchOf(*host, *link) != port->switchIndex) {
+            return nullptr;
+        }
+        port->stayed = host->change;
     }
-    const Port &port = found->second;
-    bool stayed = HostSwitchOf(*host, *link) == port.switchIndex;
-    const char *name = keys[0].text.c_str();
-    return stayed && strcmp(name, port.switchName) == 0 ? link : nullptr;
+    return link;
 }
 
 KnfStatus PortTypeGet(LinuxHost *host, const Params &keys, char *record) {
     Outcome outcome = HostLinks(host);
-    const Link *link = outcome == FINE ? LinkOf(host, keys[0].number) : nullptr;
+    Link *link = outcome == FINE ? LinkOf(host, keys[0].number) : nullptr;
     if (link == nullptr) {
         return outcome == FINE ? STATUS_NOT_FOUND : StatusOf(outcome);
     }
+    HostMarkOne(host, link);
     Port *port = HostJoin(host, *link);
     port->birth = link->birth;
     port->switchIndex = HostSwitchOf(*host, *link);
+    port->stayed = host->change;
     memset(port->switchName, 0, sizeof port->switchName);
     const char *name = SwitchName(*host, port->switchIndex);
     memcpy(port->switchName, name, std::min(strlen(name), sizeof port->switchName - 1));

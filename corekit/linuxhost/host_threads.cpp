@@ -19,34 +19,45 @@ Threads *OpenThreads(LinuxHost *host) {
     return host->threadsOpen ? &host->threads : nullptr;
 }
 
-bool IsSelf(int64_t id) {
-    return id == getpid();
+// A thread that was watched at some time. Its nodes are read one after another.
+ThreadUse *UseOf(LinuxHost *host, int64_t id) {
+    if (host->use == nullptr || host->use->tid != id) {
+        auto found = id > 0 && id <= INT32_MAX ? host->uses.find(static_cast<u32>(id)) : host->uses.end();
+        host->use = found != host->uses.end() ? &found->second : nullptr;
+    }
+    return host->use;
+}
+
+// Of what is not watched, which spares each read of a vcpu the call.
+bool IsSelf(LinuxHost *host, int64_t id) {
+    return UseOf(host, id) == nullptr && id == getpid();
 }
 
 Outcome Watch(LinuxHost *host, u32 pid, u32 tid, u32 wanted) {
     Threads *threads = OpenThreads(host);
+    host->uses[tid].tid = tid;
     return threads != nullptr ? ThreadWatch(threads, pid, tid, wanted) : UNSUPPORTED;
 }
 
-Outcome ReadThread(LinuxHost *host, u32 tid, ThreadNode node, const ThreadRow **row) {
+Outcome ReadThread(LinuxHost *host, int64_t id, ThreadNode node, const ThreadRow **row) {
     Threads *threads = OpenThreads(host);
-    if (threads == nullptr) {
-        return UNSUPPORTED;
+    ThreadUse *use = UseOf(host, id);
+    if (threads == nullptr || use == nullptr) {
+        return threads == nullptr ? UNSUPPORTED : GONE;
     }
-    ThreadUse &use = host->uses[tid];
-    PassJoin(&use.pass, &use.served[node], host->now());
-    return ThreadRead(threads, tid, use.pass.generation, row);
+    PassJoin(&use->pass, &use->served[node], host->now());
+    return ThreadRead(threads, use->tid, use->pass.generation, row);
 }
 
 // A vcpu that was listed. Of the calling process itself only the times are of use to anyone: what else there is to ask
 // of a vcpu is 0 and costs nothing.
 Outcome ReadVcpu(LinuxHost *host, int64_t id, ThreadNode node, const ThreadRow **row) {
     static const ThreadRow NOTHING = {};
-    if (IsSelf(id)) {
+    if (IsSelf(host, id)) {
         *row = &NOTHING;
         return FINE;
     }
-    return id > 0 && id <= INT32_MAX ? ReadThread(host, static_cast<u32>(id), node, row) : GONE;
+    return ReadThread(host, id, node, row);
 }
 
 // The guest behind an id that stands for it; null unless its vcpus can be told.
@@ -73,6 +84,21 @@ KnfStatus ChainGet(LinuxHost *host, const Params &keys, FieldLayout field, char 
 void AddWorker(LinuxHost *host, const std::string &name, const WorkerThread &thread, Params *entries) {
     if (host->workers.insert_or_assign(name, thread).second) {
         entries->push_back(ParamOf(name));
+    }
+}
+
+// The kernel gives all transmit threads of some drivers one name: those bear their number behind it.
+void AddNicThreads(LinuxHost *host, Params *entries) {
+    std::unordered_map<std::string, u32> times;
+    for (const WorkerThread &thread : host->guests.nics) {
+        times[thread.name]++;
+    }
+    for (const WorkerThread &thread : host->guests.nics) {
+        std::string name = thread.name;
+        if (times[thread.name] > 1) {
+            name.append("/").append(std::to_string(thread.tid));
+        }
+        AddWorker(host, name, thread, entries);
     }
 }
 
@@ -105,7 +131,7 @@ KnfStatus VcpuList(LinuxHost *host, const Params &keys, Params *entries) {
 }
 
 KnfStatus VcpuTimesGet(LinuxHost *host, const Params &keys, char *record) {
-    if (IsSelf(keys[0].number)) {
+    if (IsSelf(host, keys[0].number)) {
         SelfRow self = SelfRead();
         Put(record, vcpu_times::ELAPSED, self.elapsed / NANOSECONDS);
         Put(record, vcpu_times::USED, self.run / NANOSECONDS);
@@ -156,9 +182,7 @@ KnfStatus WorldletList(LinuxHost *host, const Params & /*keys*/, Params *entries
             AddWorker(host, "NetWdt-Async-" + owner + "-vhost-" + std::to_string(thread.tid), thread, entries);
         }
     }
-    for (const WorkerThread &thread : host->guests.nics) {
-        AddWorker(host, thread.name, thread, entries);
-    }
+    AddNicThreads(host, entries);
     return STATUS_OK;
 }
 

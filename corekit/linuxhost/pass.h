@@ -5,7 +5,7 @@
 
 #include "interface/types.h"
 
-constexpr u64 PASS_AGE = 20000000;  // ns that a generation may be served; the most that a sample is late
+constexpr u64 PASS_AGE = 20000000;  // ns that a generation may be served once the kernel has told it
 constexpr u64 PASS_FLOOR =
     1000000;  // ns that it is served even to who had it: each instance listed twice is no two passes
 
@@ -13,7 +13,7 @@ struct Pass {
     u32 generation = 0;  // 0: none yet
     u32 reads = 0;       // served from it
     u32 expected = 0;    // reads of the ones before; a pass may take several, of which the last serves only few
-    u64 startedAt = 0;   // ns
+    u64 startedAt = 0;   // ns; a look that takes long is no older for it, or each read would need one of its own
 };
 
 // One more read, by an instance that was `*served` before. True when it begins a generation: the caller then asks the

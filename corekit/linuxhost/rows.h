@@ -73,6 +73,7 @@ struct Link {
     char name[NAME_SIZE] = {};
     char device[32] = {};  // the parent device, as "0000:31:00.0"; empty for what is no NIC
     char bus[12] = {};     // the parent device's bus, as "pci"
+    u64 mark = 0;          // what only this interface has, ever; 0: not told
 };
 
 // Running counters of one interface, from its own point of view.

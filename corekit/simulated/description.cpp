@@ -2,7 +2,6 @@
 
 #include "corekit/simulated/host_nodes.h"
 
-#include <sstream>
 #include <utility>
 
 namespace {
@@ -373,11 +372,11 @@ void LoadLine(Line *line, bool isFirst, const LineReader &fault) {
 }
 
 bool LoadText(const std::string &text, const char *file, Host *host, const LineReader &fault, std::string *error) {
-    std::istringstream stream(text);
+    std::string_view rest = text;
     bool isFirst = true;
     int number = 0;
     std::string problem;
-    for (std::string source; problem.empty() && std::getline(stream, source);) {
+    for (std::string source; problem.empty() && TakePart(&rest, '\n', &source);) {
         number++;
         Line line = {host, {}, {}, {}};
         SplitWords(&line, source);

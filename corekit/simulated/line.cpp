@@ -4,7 +4,6 @@
 #include <cctype>
 #include <cerrno>
 #include <cstdlib>
-#include <sstream>
 #include <utility>
 
 namespace {
@@ -155,10 +154,18 @@ std::optional<i64> ParseSigned(const std::string &text) {
     return static_cast<i64>(*value);
 }
 
+bool TakePart(std::string_view *rest, char end, std::string *part) {
+    size_t length = std::min(rest->find(end), rest->size());
+    part->assign(rest->substr(0, length));
+    bool any = !rest->empty();
+    rest->remove_prefix(std::min(length + 1, rest->size()));
+    return any;
+}
+
 std::vector<std::string> SplitCommas(const std::string &text) {
     std::vector<std::string> parts;
-    std::istringstream stream(text);
-    for (std::string part; std::getline(stream, part, ',');) {
+    std::string_view rest = text;
+    for (std::string part; TakePart(&rest, ',', &part);) {
         parts.push_back(part);
     }
     return parts;

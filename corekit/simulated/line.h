@@ -8,6 +8,7 @@
 #include <limits>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 constexpr i64 MAX_ID = 0xffffffff;
@@ -40,6 +41,8 @@ std::string Quoted(const std::string &text);
 // A decimal number, signed or up to 2^64-1, or a hexadecimal one behind 0x; all in 64 bits.
 std::optional<u64> ParseNumber(const std::string &text);
 std::optional<i64> ParseSigned(const std::string &text);
+// Cuts the part up to `end` off the text, and `end` with it. False when nothing is left.
+bool TakePart(std::string_view *rest, char end, std::string *part);
 std::vector<std::string> SplitCommas(const std::string &text);
 
 // The next plain word. `what` is what the line should have there.

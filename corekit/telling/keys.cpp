@@ -7,7 +7,7 @@ namespace {
 constexpr char PROGRAM[] = "of the program itself";
 constexpr char OFFLOAD[] =
     "packets as they are handed over: where segmentation is offloaded, one stands for many on the "
-    "wire; on a NIC, those of the wire";
+    "wire; on a NIC that is no virtual one, those of the wire";
 constexpr char DROPS[] = "dropped packets and errors of the interface";
 constexpr char STACK[] = "/proc/net/snmp of the network namespace";
 constexpr char STACK6[] = "/proc/net/snmp6 of the network namespace";
@@ -26,9 +26,10 @@ const KeyRow KEY_ROWS[] = {
     {"cpu.topology.core", EXACT, "CPUs, those that are off too, by cores of those that are on"},
     {"cpu.topology.llc", EXACT, "CPUs that share the last-level cache of CPU 0; 0 when the kernel does not tell"},
     {"cpu.topology.package", EXACT, "as \"core\""},
-    {"cpu.used", EXACT, "/proc/stat, all but idle and iowait; grain 10 ms, so 1 % of a second"},
+    {"cpu.used", EXACT, "/proc/stat, all but idle and iowait; grain 10 ms, so 1 % of a second",
+     FEATURE_CPU_TIMES},
     {"cpu.wdt", CLOSE, "irq and softirq of /proc/stat: what the kernel does for interrupts; most kernels sample it by the "
-                       "tick and miss short bursts"},
+                       "tick and miss short bursts", FEATURE_CPU_TIMES},
     {"ports.name", EXACT, "name of the guest (-name of its command line) that holds the tap; else of the interface",
      FEATURE_TAP_HOLDERS, CLOSE},
     {"ports.switch", EXACT, "bridge, or the interface below a macvtap or macvlan; a stand-in for interfaces on none"},
@@ -49,21 +50,23 @@ const KeyRow KEY_ROWS[] = {
     {"ports.txwdt.*", ABSENT, "a vhost worker does not count why it woke"},
     {"ports.vnic.*", ABSENT, "virtio is neither of the two models, and its own counters lie inside the guest"},
     {"ports.physnic.devname", EXACT, "interface, driver and bus address"},
-    {"ports.physnic.txpps", EXACT, "packets of the NIC"},
+    {"ports.physnic.txpps", EXACT, "packets of the NIC", FEATURE_WIRE_PACKETS, CLOSE},
     {"ports.physnic.txmbps", EXACT, "bytes of the NIC"},
-    {"ports.physnic.txsize", EXACT, "bytes by packets"},
+    {"ports.physnic.txsize", EXACT, "bytes by packets", FEATURE_WIRE_PACKETS, CLOSE},
     {"ports.physnic.txeps", EXACT, "tx_errors and tx_dropped, as far as the driver counts"},
-    {"ports.physnic.rxpps", EXACT, "packets of the NIC"},
+    {"ports.physnic.rxpps", EXACT, "packets of the NIC", FEATURE_WIRE_PACKETS, CLOSE},
     {"ports.physnic.rxmbps", EXACT, "bytes of the NIC"},
-    {"ports.physnic.rxsize", EXACT, "bytes by packets"},
+    {"ports.physnic.rxsize", EXACT, "bytes by packets", FEATURE_WIRE_PACKETS, CLOSE},
     {"ports.physnic.rxeps", EXACT, "rx_errors, rx_dropped and rx_missed, as far as the driver counts"},
-    {"ports.txqueue.count", EXACT, "queues of the NIC; 0 when it has several and nobody counts them one by one", FEATURE_QUEUES, EXACT},
-    {"ports.txqueue.details.pps", EXACT, "counters of the queue", FEATURE_QUEUE_COUNTERS, CLOSE},
-    {"ports.txqueue.details.eps", EXACT, "counters of the queue", FEATURE_QUEUE_COUNTERS, CLOSE},
-    {"ports.txqueue.details.qstops", EXACT, "where the driver counts them, from kernel 6.10 on; else 0, not measured",
-     FEATURE_QUEUE_COUNTERS},
+    {"ports.txqueue.count", EXACT, "queues of the NIC; 0 when it has several and nobody counts them one by one", FEATURE_QUEUES, CLOSE},
+    {"ports.txqueue.details.pps", EXACT, "packets that the driver counts of the queue; those of the NIC where it has but one",
+     FEATURE_QUEUE_COUNTERS, CLOSE},
+    {"ports.txqueue.details.eps", EXACT, "drops that the driver counts of the queue; drops and errors of the NIC where it has but one; "
+     "drops of its queue discipline, which is close", FEATURE_QUEUE_ERRORS},
+    {"ports.txqueue.details.qstops", EXACT, "where the driver tells the kernel, from 6.10 on, how often it stopped each queue",
+     FEATURE_QUEUE_STOPS},
     {"ports.txqueue.active", EXACT, "by \"pps\"", FEATURE_QUEUE_COUNTERS, CLOSE},
-    {"ports.rxqueue.count", EXACT, "queues of the NIC", FEATURE_QUEUES, EXACT},
+    {"ports.rxqueue.count", EXACT, "queues of the NIC", FEATURE_QUEUES, CLOSE},
     {"ports.rxqueue.details", ZERO, "empty lists: no filter of a NIC serves a port of a bridge"},
     {"ports.rxqueue.active", ZERO, "no filters"},
     {"ports.rxqueue.filters", ZERO, "no filters"},

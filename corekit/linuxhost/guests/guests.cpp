@@ -6,9 +6,12 @@
 #include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
+#include <linux/if_tun.h>
 #include <map>
 #include <memory>
+#include <sys/ioctl.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/sysmacros.h>
 #include <unistd.h>
 
@@ -27,6 +30,14 @@ struct Process {
     std::map<u32, HeldTap> held{};
 };
 
+// How much a process that holds a tap looks like the guest behind it.
+enum Claim : u8 { CLAIM_HOLDS, CLAIM_NAMED, CLAIM_VCPUS };
+
+struct ClaimedTap {
+    HeldTap tap;
+    Claim claim;
+};
+
 struct Scan {
     const ProcRoot &root;
     Guests *guests;
@@ -34,7 +45,7 @@ struct Scan {
     bool ownNetTold = false;
     struct stat ownNet {};
     std::map<u32, std::vector<WorkerThread>> vhost{};  // kernel threads, by the PID in their name
-    std::map<std::pair<u32, std::string>, HeldTap> taps{};
+    std::map<std::pair<u32, std::string>, ClaimedTap> taps{};
 
     std::string_view Text(const std::string &path, u32 limit = LIMIT) {
         std::string_view text;
@@ -43,8 +54,9 @@ struct Scan {
     }
 };
 
-// The numbers among the names of a directory, ascending. An errno, or 0.
-int Numbers(int parent, const std::string &path, std::vector<u32> *numbers) {
+// The numbers among the names of a directory, ascending; the kernel lists them that way, so that a limit leaves out the
+// highest. An errno, or 0.
+int Numbers(int parent, const std::string &path, std::vector<u32> *numbers, size_t limit = SIZE_MAX) {
     int descriptor = openat(parent, path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     DIR *directory = descriptor >= 0 ? fdopendir(descriptor) : nullptr;
     if (directory == nullptr) {
@@ -54,7 +66,7 @@ int Numbers(int parent, const std::string &path, std::vector<u32> *numbers) {
         }
         return error;
     }
-    while (const dirent *entry = readdir(directory)) {
+    while (const dirent *entry = numbers->size() < limit ? readdir(directory) : nullptr) {
         u64 number = 0;
         if (ProcNumber(entry->d_name, &number) && number <= 0xffffffff) {
             numbers->push_back(static_cast<u32>(number));
@@ -152,6 +164,28 @@ bool InOurNet(const Scan &scan, const Process &process) {
                                 net.st_ino == scan.ownNet.st_ino && net.st_dev == scan.ownNet.st_dev);
 }
 
+// The namespace of a tap, which its holder may not share: a copy of its descriptor tells, to who may trace the process
+// and administer that namespace. False when it does not.
+bool NetOfTap(u32 pid, u32 descriptor, struct stat *net) {
+    auto process = static_cast<int>(syscall(SYS_pidfd_open, pid, 0));
+    auto copy = process >= 0 ? static_cast<int>(syscall(SYS_pidfd_getfd, process, descriptor, 0)) : -1;
+    int space = copy >= 0 ? ioctl(copy, TUNGETDEVNETNS) : -1;
+    bool told = space >= 0 && fstat(space, net) == 0;
+    for (int opened : {process, copy, space}) {
+        if (opened >= 0) {
+            close(opened);
+        }
+    }
+    return told;
+}
+
+bool IsOurTap(const Scan &scan, const Process &process, u32 descriptor) {
+    struct stat net = {};
+    return scan.ownNetTold && NetOfTap(process.pid, descriptor, &net)
+               ? net.st_ino == scan.ownNet.st_ino && net.st_dev == scan.ownNet.st_dev
+               : InOurNet(scan, process);
+}
+
 // The number in "CPU n/KVM".
 bool VcpuNumber(std::string_view name, u64 *number) {
     if (!StartsWith(name, "CPU ")) {
@@ -208,24 +242,30 @@ void ReadMacs(const std::vector<CommandNic> &nics, Process *process) {
 }
 
 // A tap with several queues is held by as many descriptors, and a process that hands a guest its tap may hold it too:
-// the guest with vcpus is who uses it.
-void TakeTap(Scan *scan, const HeldTap &tap) {
+// who looks most like a guest uses it. Of two that look alike neither is believed, unless both say the same.
+void TakeTap(Scan *scan, const HeldTap &tap, Claim claim) {
     const std::vector<Guest> &guests = scan->guests->guests;
-    auto [place, added] = scan->taps.try_emplace({tap.index, tap.name}, tap);
-    HeldTap *known = &place->second;
-    bool better = guests[known->guest].vcpus.empty() && !guests[tap.guest].vcpus.empty();
-    bool more = known->guest == tap.guest && !known->macTold;
-    if (!added && (better || more)) {
-        *known = tap;
+    auto [place, added] = scan->taps.try_emplace({tap.index, tap.name}, ClaimedTap{tap, claim});
+    ClaimedTap *known = &place->second;
+    u32 holder = known->tap.guest;
+    if (added || claim < known->claim) {
+        return;
+    }
+    if (claim > known->claim || (holder == tap.guest && !known->tap.macTold)) {
+        *known = {tap, claim};
+    } else if (holder != tap.guest && claim != CLAIM_HOLDS) {
+        bool alike = claim == CLAIM_NAMED && holder != NO_GUEST && !guests[holder].name.empty() &&
+                     guests[holder].name == guests[tap.guest].name;
+        if (!alike) {
+            known->tap.guest = NO_GUEST;
+            known->tap.macTold = false;
+            memset(known->tap.mac, 0, sizeof known->tap.mac);
+        }
     }
 }
 
 void TakeGuest(Scan *scan, Process *process) {
     Guests *guests = scan->guests;
-    if (!InOurNet(*scan, *process)) {
-        guests->foreign++;
-        return;
-    }
     if (guests->guests.size() >= MAX_GUESTS) {
         return;
     }
@@ -236,27 +276,41 @@ void TakeGuest(Scan *scan, Process *process) {
     guests->guests.push_back(guest);
     for (auto &[descriptor, tap] : process->held) {
         tap.guest = static_cast<u32>(guests->guests.size() - 1);
-        TakeTap(scan, tap);
+        TakeTap(scan, tap,
+                !guest.vcpus.empty()                 ? CLAIM_VCPUS
+                : !guest.name.empty() || tap.macTold ? CLAIM_NAMED
+                                                     : CLAIM_HOLDS);
     }
 }
 
 void ScanProcess(Scan *scan, u32 pid) {
     Process process = {scan->root, pid, std::to_string(pid) + "/"};
     std::vector<u32> descriptors;
-    int error = Numbers(scan->root.proc, process.directory + "fd", &descriptors);
+    int error = Numbers(scan->root.proc, process.directory + "fd", &descriptors, MAX_DESCRIPTORS + 1);
     if (descriptors.empty()) {
         TakeKernelThread(scan, pid);
     }
     scan->guests->refused += error == EACCES || error == EPERM ? 1 : 0;
+    if (descriptors.size() > MAX_DESCRIPTORS) {
+        descriptors.pop_back();
+        scan->guests->crowded = scan->guests->crowded == 0 ? pid : scan->guests->crowded;
+    }
+    bool foreign = false;
     for (u32 descriptor : descriptors) {
         HeldTap tap;
-        if (process.held.size() < MAX_HELD && TapOf(scan, process, descriptor, &tap)) {
+        if (process.held.size() >= MAX_HELD || !TapOf(scan, process, descriptor, &tap)) {
+            continue;
+        }
+        if (IsOurTap(*scan, process, descriptor)) {
             process.held.emplace(descriptor, tap);
+        } else {
+            foreign = true;
         }
     }
     if (!process.held.empty()) {
         TakeGuest(scan, &process);
     }
+    scan->guests->foreign += foreign && process.held.empty() ? 1 : 0;
 }
 
 }  // namespace
@@ -279,8 +333,8 @@ Outcome GuestsScan(const ProcRoot &root, Guests *guests) {
         std::vector<WorkerThread> &threads = scan.vhost[guest.pid];
         guest.vhost.insert(guest.vhost.end(), threads.begin(), threads.end());
     }
-    for (const auto &[name, tap] : scan.taps) {
-        guests->taps.push_back(tap);
+    for (const auto &[name, claimed] : scan.taps) {
+        guests->taps.push_back(claimed.tap);
     }
     return FINE;
 }

@@ -74,11 +74,15 @@ bool AttrNext(std::string_view *rest, u16 *type, std::string_view *payload) {
 }
 
 u32 AttrFill(const AttrField *table, size_t count, std::string_view attributes, void *row) {
+    u64 wanted = 0;  // a bit a type, several types a bit: most attributes of a message are of no use
+    for (size_t i = 0; i < count; i++) {
+        wanted |= u64{1} << table[i].type % 64;
+    }
     u32 known = 0;
     u16 type = 0;
     std::string_view payload;
     while (AttrNext(&attributes, &type, &payload)) {
-        for (size_t i = 0; i < count; i++) {
+        for (size_t i = (wanted >> type % 64 & 1) != 0 ? 0 : count; i < count; i++) {
             if (table[i].type == type) {
                 known |= FillOne(table[i], i, count, payload, row);
             }

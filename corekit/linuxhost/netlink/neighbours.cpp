@@ -43,13 +43,11 @@ bool ByIndex(const Learned &left, const Learned &right) {
 
 }  // namespace
 
-Outcome AddressesLoad(NetlinkSocket *socket, std::vector<u32> *indices) {
+Outcome AddressesLoad(NetlinkSocket *socket, u32 index, std::vector<u32> *indices) {
     ifaddrmsg header = {};
+    header.ifa_index = index;
     NetlinkRequest request = RequestOf(RTM_GETADDR, NLM_F_DUMP, &header, sizeof header);
-    Outcome outcome = NetlinkTalk(socket, &request, {TakeAddress, indices});
-    std::sort(indices->begin(), indices->end());
-    indices->erase(std::unique(indices->begin(), indices->end()), indices->end());
-    return outcome;
+    return NetlinkTalk(socket, &request, {TakeAddress, indices});
 }
 
 Outcome LearnedLoad(NetlinkSocket *socket, std::vector<Learned> *learned) {

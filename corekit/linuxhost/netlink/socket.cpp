@@ -2,8 +2,11 @@
 
 #include <algorithm>
 #include <cstring>
-#include <libmnl/libmnl.h>
+#include <linux/ethtool.h>
 #include <linux/netlink.h>
+#include <linux/sockios.h>
+#include <net/if.h>
+#include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <sys/time.h>
 #include <unistd.h>
@@ -29,6 +32,20 @@ ssize_t KernelReceive(void *context, void *buffer, size_t size) {
     message.msg_iovlen = 1;
     ssize_t length = recvmsg(static_cast<NetlinkSocket *>(context)->fd, &message, MSG_TRUNC);
     return length > 0 && from.nl_pid != 0 ? 0 : length;
+}
+
+// The one request that is none of netlink's; any socket takes it.
+bool KernelDriver(void *context, const char *name, char *driver) {
+    ethtool_drvinfo info = {};
+    ifreq request = {};
+    info.cmd = ETHTOOL_GDRVINFO;
+    memcpy(request.ifr_name, name, NAME_SIZE);
+    request.ifr_data = reinterpret_cast<char *>(&info);
+    if (ioctl(static_cast<NetlinkSocket *>(context)->fd, SIOCETHTOOL, &request) != 0) {
+        return false;
+    }
+    memcpy(driver, info.driver, NAME_SIZE - 1);
+    return true;
 }
 
 ssize_t Receive(NetlinkSocket *socket) {
@@ -66,10 +83,20 @@ void Take(const nlmsghdr *message, u32 sequence, bool dump, const NetlinkReader 
     }
 }
 
-void TakeAll(const NetlinkSocket &socket, int length, u32 sequence, bool dump, const NetlinkReader &reader,
+// The next of the messages in `*rest`, or null at their end, and at a length that does not fit.
+const nlmsghdr *NextMessage(std::string_view *rest) {
+    auto message = reinterpret_cast<const nlmsghdr *>(rest->data());
+    if (rest->size() < sizeof *message || message->nlmsg_len < sizeof *message || message->nlmsg_len > rest->size()) {
+        return nullptr;
+    }
+    rest->remove_prefix(std::min<size_t>(NLMSG_ALIGN(message->nlmsg_len), rest->size()));
+    return message;
+}
+
+void TakeAll(const NetlinkSocket &socket, size_t length, u32 sequence, bool dump, const NetlinkReader &reader,
              Progress *progress) {
-    auto message = reinterpret_cast<const nlmsghdr *>(socket.buffer.get());
-    for (; mnl_nlmsg_ok(message, length) && !progress->done; message = mnl_nlmsg_next(message, &length)) {
+    std::string_view rest(socket.buffer.get(), length);
+    while (const nlmsghdr *message = progress->done ? nullptr : NextMessage(&rest)) {
         Take(message, sequence, dump, reader, progress);
     }
 }
@@ -85,7 +112,7 @@ Outcome ReadAnswer(NetlinkSocket *socket, u32 sequence, bool dump, const Netlink
         progress.interrupted |= length < 0;
         length = std::max<ssize_t>(length, 0);
         cut |= static_cast<size_t>(length) > NETLINK_BUFFER;
-        auto whole = static_cast<int>(std::min<size_t>(static_cast<size_t>(length), NETLINK_BUFFER));
+        size_t whole = std::min<size_t>(static_cast<size_t>(length), NETLINK_BUFFER);
         TakeAll(*socket, whole, sequence, dump, reader, &progress);
     }
     if (!progress.done || cut) {
@@ -129,7 +156,7 @@ Outcome NetlinkOpen(NetlinkSocket *netlink, int protocol, u32 groups) {
         return outcome;
     }
     netlink->fd = fd;
-    netlink->io = {KernelSend, KernelReceive, netlink};
+    netlink->io = {KernelSend, KernelReceive, netlink, KernelDriver};
     return FINE;
 }
 
@@ -195,9 +222,8 @@ Outcome NetlinkNotices(NetlinkSocket *socket, const NetlinkReader &reader) {
         if (length <= 0 || static_cast<size_t>(length) > NETLINK_BUFFER) {
             continue;
         }
-        auto rest = static_cast<int>(length);
-        auto message = reinterpret_cast<const nlmsghdr *>(socket->buffer.get());
-        for (; mnl_nlmsg_ok(message, rest); message = mnl_nlmsg_next(message, &rest)) {
+        std::string_view rest(socket->buffer.get(), static_cast<size_t>(length));
+        while (const nlmsghdr *message = NextMessage(&rest)) {
             reader.row(reader.context, message);
         }
     }

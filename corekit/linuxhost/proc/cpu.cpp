@@ -60,19 +60,22 @@ struct Reader {
 // The list of CPUs behind the cache of the highest level that is not for instructions alone.
 bool LastCache(Reader *reader, const std::string &cpu, std::string *list) {
     u64 highest = 0;
+    std::string last;
     for (u32 index = 0; index < CACHES; index++) {
         std::string cache = cpu + "/cache/index" + std::to_string(index) + "/";
         u64 level = 0;
-        std::string_view text;
         if (!reader->Number(cache + "level", &level)) {
             break;
         }
-        if (level > highest && reader->Text(cache + "shared_cpu_list", &text)) {
+        if (level > highest) {
             highest = level;
-            *list = text;
+            last = cache;
         }
     }
-    return highest > 0;
+    std::string_view text;
+    bool told = highest > 0 && reader->Text(last + "shared_cpu_list", &text);
+    *list = text;
+    return told;
 }
 
 // Of all CPUs that tell; those that are off do not. A CPU that says nothing of its place counts as a core of its own.

@@ -71,9 +71,10 @@ void Forget(Thread *thread) {
     thread->gone = true;
 }
 
+// A kernel that does not account shows three zeros of a thread that has run, as each one has that can be watched.
 void ParseTimes(std::string_view text, ThreadRow *row) {
-    bool good =
-        ProcTakeNumber(&text, &row->run) && ProcTakeNumber(&text, &row->ready) && ProcTakeNumber(&text, &row->runs);
+    bool good = ProcTakeNumber(&text, &row->run) && ProcTakeNumber(&text, &row->ready) &&
+                ProcTakeNumber(&text, &row->runs) && (row->run | row->ready | row->runs) != 0;
     row->known |= good ? u32{THREAD_TIMES} : 0;
 }
 

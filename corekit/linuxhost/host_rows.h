@@ -1,0 +1,69 @@
+// What was asked of the Linux host, as it is kept from one look at the kernel to the next: interfaces, NICs, switches
+// and threads. Plain values, owned by the tables of LinuxHost. A port takes 168 bytes, a NIC 200 and those of its
+// queues.
+#pragma once
+
+#include "corekit/linuxhost/guests/guests.h"
+#include "corekit/linuxhost/netlink/queues.h"
+#include "corekit/linuxhost/pass.h"
+
+// An interface that was asked for.
+struct Port {
+    u32 index = 0;
+    u32 row = 0;               // where its link stood in the table when it was last looked for
+    Port *readNext = nullptr;  // what was read behind it in the last pass
+    Port *dumpNext = nullptr;  // and what came behind it in the last dump
+    u32 birth = 0;             // of the link that its type was told of; 0: not told yet
+    u32 switchIndex = 0;       // then; 0: on none
+    u32 stayed = 0;            // the state of the host in which it was still there
+    char switchName[NAME_SIZE] = {};
+    u32 joined = 0;  // the state of the host that `type` and `tap` are of
+    i64 type = 0;
+    const HeldTap *tap = nullptr;  // of the host's guests; null unless a process holds it
+    u32 scan = 0;                  // that `tap` is of, and the link
+    u32 tapBirth = 0;
+    LinkCounters counters{};
+    u32 filled = 0;     // generation of the counters
+    u32 reloads = 0;    // of the host's table, when they were read
+    u32 served = 0;     // as a port
+    u32 servedNic = 0;  // as a NIC
+};
+
+// A NIC that was asked for, by the name it bore then.
+struct Nic {
+    char name[NAME_SIZE] = {};
+    u32 index = 0;  // of the interface
+    u32 birth = 0;
+    u32 hardware = 0;  // of the NIC itself: another one for a VLAN
+    Pass counting{};
+    u32 countServed[2] = {};
+    QueueCount count{};
+    bool counted = false;  // by the kernel; else taken for granted
+    bool chosen = false;
+    QueueSource source = QUEUES_UNTOLD;
+    Pass reading{};
+    std::vector<QueueCounters> queues;
+    std::vector<QueueCounters> told;    // by the kernel, by the last look that told of the queue
+    std::vector<QueueCounters> before;  // counted until the kernel began again
+    std::vector<u32> queueServed;
+};
+
+struct SwitchEntry {
+    u32 index;  // of the bridge or lower device; 0 for interfaces on none
+    char name[NAME_SIZE];
+};
+
+struct Member {
+    u32 switchIndex;
+    u32 index;
+};
+
+// The four records of the IP stack.
+enum StackRecord : u8 { STACK_IPV4, STACK_IPV6, STACK_TCP, STACK_UDP, STACK_RECORDS };
+
+// A thread that is read by several nodes: one look serves them all.
+struct ThreadUse {
+    u32 tid = 0;
+    Pass pass{};
+    u32 served[4] = {};
+};
