@@ -84,12 +84,7 @@ struct Kernel {
     std::deque<Strings> answers;
     std::deque<std::string> waiting;
     u32 sequence = 0;
-    const char *driver = nullptr;  // of all interfaces
 
-    static bool Driver(void *context, const char *, char *driver) {
-        const char *name = static_cast<Kernel *>(context)->driver;
-        return name != nullptr && strcpy(driver, name) != nullptr;
-    }
     static ssize_t Send(void *context, const void *message, size_t size) {
         auto *kernel = static_cast<Kernel *>(context);
         if (kernel->answers.empty()) {
@@ -190,49 +185,6 @@ TEST(LinuxNetlink, ADumpIsBelievedOnlyWhenItsEndWasSeen) {
         EXPECT_EQ(LinksLoad(&socket, &table), one.outcome);
         EXPECT_EQ(table.rows.size(), one.links);
         EXPECT_TRUE(kernel.answers.empty() && kernel.waiting.empty());
-    }
-}
-
-TEST(LinuxNetlink, PortsOfABridgeHaveTheKindThatIsProven) {
-    auto veth = [](u8 family, int index, u32 master, u32 peer, bool foreign = false) {
-        ifinfomsg header = {};
-        header.ifi_family = family;
-        header.ifi_index = index;
-        return Message(RTM_NEWLINK, Bytes(header) + Attr(IFLA_IFNAME, "v") + Attr(IFLA_MTU, Bytes(1500)) +
-                                        Attr(IFLA_MASTER, Bytes(master)) + Attr(IFLA_LINK, Bytes(peer)) +
-                                        (foreign ? Attr(IFLA_LINK_NETNSID, Bytes(0)) : "") +
-                                        (family == 0 ? Attr(IFLA_LINKINFO, Attr(IFLA_INFO_KIND, "veth")) : ""));
-    };
-    // Ports 11 to 74 of a bridge, of which 11 has the peer 5; 6 says the same of 12, but means another namespace.
-    std::string others = Told(2, "br0", "bridge") + veth(0, 5, 0, 11) + veth(0, 6, 0, 12, true), indices, ports, news;
-    for (int i = 2; i < 75; i++) {
-        indices += i == 2 || i == 5 || i == 6 || i > 10 ? Counted(static_cast<u32>(i), 0) : "";
-        ports += i > 10 ? veth(AF_BRIDGE, i, 2, i < 13 ? static_cast<u32>(i) - 6 : 5) : "";
-    }
-    for (u32 i = 100; i < 120; i++) {
-        news += Counted(i, 0);
-    }
-    Strings list = {indices, Done()}, many = {indices + news, Done()}, longer = {indices + Counted(80, 0), Done()}, brief = {ports, Done()}, rest = {others, Done()};
-    Strings whole = {Told(11, "v", "veth", 2) + Told(12, "t", "tun", 2), Done()}, torn = {Torn()[0], Done()};
-    struct Case { const char *what; std::deque<Strings> answers; const char *driver; LinkKind kind; size_t links; };
-    for (const Case &one : {Case{"taps", {list, brief, rest}, "tun", KIND_TAP, 67},
-                            {"veths", {list, brief, rest}, "veth", KIND_VETH, 67},
-                            {"on a bond", {longer, brief, rest, {Told(80, "e", "", 5)}}, "tun", KIND_TAP, 68},
-                            {"gone", {longer, brief, rest, {Message(NLMSG_ERROR, Bytes(-ENODEV))}}, "tun", KIND_TAP, 67},
-                            {"other drivers", {list, brief, rest, whole}, "vxlan", KIND_TAP, 2},
-                            {"no driver", {list, brief, rest, whole}, nullptr, KIND_TAP, 2},
-                            {"an old kernel", {many, brief, {Done()}, whole}, "veth", KIND_TAP, 2},
-                            {"torn", {list, brief, torn, whole}, "veth", KIND_TAP, 2}}) {
-        Kernel kernel{one.answers, {}, 0, one.driver};
-        NetlinkSocket socket;
-        LinkTable table;
-        socket.io = {Kernel::Send, Kernel::Receive, &kernel, Kernel::Driver};
-        NetlinkOpen(&socket, 0);
-        EXPECT_EQ(LinksLoad(&socket, &table), FINE) << one.what;
-        EXPECT_TRUE(kernel.answers.empty()) << one.what;
-        EXPECT_EQ(table.rows.size(), one.links) << one.what;
-        EXPECT_EQ(LinksFind(table, 11)->kind, KIND_VETH) << one.what;
-        EXPECT_EQ(LinksFind(table, 12)->kind, one.kind) << one.what;
     }
 }
 

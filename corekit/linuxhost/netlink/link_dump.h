@@ -1,5 +1,6 @@
-// What the kernel tells of interfaces: one whole message each, at 4 to 5 us; or, for ports of bridges, a short one at 2
-// to 3 us that lacks the kind, which is then proven by a peer or asked of the driver. Owns nothing.
+// What the kernel tells of interfaces: one message each, at 4 to 5 us. The bridges' own list of their ports has shorter
+// ones, but lacks the kind, and the kernel walks all interfaces anew for each piece of it: no gain at 1,000 ports, and a
+// loss at 4,000. Owns nothing.
 #pragma once
 
 #include "corekit/linuxhost/netlink/socket.h"

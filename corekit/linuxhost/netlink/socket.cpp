@@ -2,11 +2,7 @@
 
 #include <algorithm>
 #include <cstring>
-#include <linux/ethtool.h>
 #include <linux/netlink.h>
-#include <linux/sockios.h>
-#include <net/if.h>
-#include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <sys/time.h>
 #include <unistd.h>
@@ -32,20 +28,6 @@ ssize_t KernelReceive(void *context, void *buffer, size_t size) {
     message.msg_iovlen = 1;
     ssize_t length = recvmsg(static_cast<NetlinkSocket *>(context)->fd, &message, MSG_TRUNC);
     return length > 0 && from.nl_pid != 0 ? 0 : length;
-}
-
-// The one request that is none of netlink's; any socket takes it.
-bool KernelDriver(void *context, const char *name, char *driver) {
-    ethtool_drvinfo info = {};
-    ifreq request = {};
-    info.cmd = ETHTOOL_GDRVINFO;
-    memcpy(request.ifr_name, name, NAME_SIZE);
-    request.ifr_data = reinterpret_cast<char *>(&info);
-    if (ioctl(static_cast<NetlinkSocket *>(context)->fd, SIOCETHTOOL, &request) != 0) {
-        return false;
-    }
-    memcpy(driver, info.driver, NAME_SIZE - 1);
-    return true;
 }
 
 ssize_t Receive(NetlinkSocket *socket) {
@@ -156,7 +138,7 @@ Outcome NetlinkOpen(NetlinkSocket *netlink, int protocol, u32 groups) {
         return outcome;
     }
     netlink->fd = fd;
-    netlink->io = {KernelSend, KernelReceive, netlink, KernelDriver};
+    netlink->io = {KernelSend, KernelReceive, netlink};
     return FINE;
 }
 

@@ -16,9 +16,6 @@ struct NetlinkIo {
     ssize_t (*send)(void *context, const void *message, size_t size);
     ssize_t (*receive)(void *context, void *buffer, size_t size);
     void *context;
-    // The driver of the interface of this name, both NAME_SIZE bytes; false when it tells none. May be null: nobody is
-    // asked then.
-    bool (*driver)(void *context, const char *name, char *driver) = nullptr;
 };
 
 struct NetlinkSocket {
