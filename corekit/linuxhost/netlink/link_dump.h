@@ -1,6 +1,6 @@
 // What the kernel tells of interfaces: one message each, at 4 to 5 us. The bridges' own list of their ports has shorter
-// ones, but lacks the kind, and the kernel walks all interfaces anew for each piece of it: no gain at 1,000 ports, and a
-// loss at 4,000. Owns nothing.
+// ones, but lacks the kind, and the kernel walks all interfaces anew for each piece of it: no gain at 1,000 ports, and
+// a loss at 4,000. Owns nothing.
 #pragma once
 
 #include "corekit/linuxhost/netlink/socket.h"
