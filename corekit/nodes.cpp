@@ -43,3 +43,19 @@ constexpr auto SIZE_OF = [] {
 u32 NodeRecordSize(u32 node) {
     return node < SIZE_OF.size() ? SIZE_OF[node] : 0;
 }
+
+EntryType NodeEntries(u32 node) {
+    switch (node) {
+    case NODE_SWITCH_LIST:
+    case NODE_VECTOR_NAMES:
+    case NODE_WORLDLET_LIST:
+        return TEXTS;
+    case NODE_SWITCH_PORTS:
+    case NODE_VECTOR_LIST:
+    case NODE_VCPU_LIST:
+    case NODE_RXQ_FILTERS:
+        return NUMBERS;
+    default:
+        return ENTRIES_UNKNOWN;
+    }
+}

@@ -25,6 +25,10 @@ enum Node : u32 {
 // Bytes of a node's record; 0 for a node that has none.
 u32 NodeRecordSize(u32 node);
 
+// What the entries of a node's instance lists are. The interface does not tell: who lists a node knows.
+enum EntryType : u8 { ENTRIES_UNKNOWN, NUMBERS, TEXTS };
+EntryType NodeEntries(u32 node);
+
 constexpr i64 PORT_HOST_STACK = 3;  // types of port
 constexpr i64 PORT_UPLINK = 4;
 constexpr i64 PORT_VNIC = 5;

@@ -57,5 +57,6 @@ int Str_Vsnprintf(char *buffer, size_t size, const char *format, va_list argumen
 #pragma GCC visibility pop
 
 constexpr KnfStatus KNF_FAILURE = 0xbad0001;  // the one failure that the program makes by itself
+constexpr uint32_t KNF_SIGNATURE_SIZE = 21;
 constexpr uint32_t KNF_INPUT_LIST = 0;
 constexpr uint32_t KNF_INSTANCE_LIST = 1;

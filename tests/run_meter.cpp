@@ -1,5 +1,7 @@
 #include "tests/run_meter.h"
 
+#include "corekit/entry/control.h"
+
 #include <csignal>
 #include <cstdlib>
 #include <fstream>
@@ -18,6 +20,12 @@ const bool signalsAsUsual = [] {
     sigset_t none;
     sigemptyset(&none);
     return sigprocmask(SIG_SETMASK, &none, nullptr) == 0;
+}();
+
+// All tests run in check mode, and so do the programs that they start.
+const bool checked = [] {
+    CorekitCheck(true);
+    return setenv("COREKIT_CHECK", "1", 1) == 0;
 }();
 
 // A directory of its own, with links to the binaries and the data, whose own paths may hold blanks.
@@ -75,7 +83,7 @@ MeterRun RunScript(const std::string &host, const std::string &script, const Run
     WriteRunFile("script", "METER='" + meter + " " + build + "lan-meter'\n" + script + "\n");
     int status = std::system(("cd " + Directory() + " && sh ./script").c_str());
     int code = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
-    EXPECT_EQ(Count(RunFile("trace"), "\nbeyond "), 0U) << "an index past the end of a list";
+    EXPECT_EQ(Count(RunFile("err"), "corekit: misuse: "), 0U) << RunFile("err");
     return {code, RunFile("out"), RunFile("err"), RunFile("trace"), RunFile("journal")};
 }
 

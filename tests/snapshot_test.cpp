@@ -3,24 +3,28 @@
 #include "corekit/entry/param_list.h"
 #include "corekit/node_source.h"
 #include "corekit/snapshot/snapshot.h"
+#include "tests/failing_new.h"
 
-#include <dlfcn.h>
 #include <fstream>
 #include <gtest/gtest.h>
 #include <memory>
 #include <sys/resource.h>
 #include <unistd.h>
 
-static int failingNew;  // the allocation from now on that fails, counted from 1
-
-void *operator new(std::size_t size) {
-    static auto *next = reinterpret_cast<void *(*)(std::size_t)>(dlsym(RTLD_NEXT, "_Znwm"));
-    return failingNew > 0 && --failingNew == 0 ? throw std::bad_alloc() : next(size);
-}
-
 namespace {
 
+using List = std::unique_ptr<KnfParamListRec, void (*)(KnfParamList)>;
+
+List KeysOf(const Params &keys) {
+    List list(KNF_ParamListCreate(KNF_INSTANCE_LIST, 2), KNF_ParamListDestroy);
+    for (const KnfParamRec &key : keys) {
+        key.isText ? KNF_ParamListAddString(list.get(), key.text.c_str()) : KNF_ParamListAddInt(list.get(), key.number);
+    }
+    return list;
+}
+
 KnfStatus Use(const std::string &file, u64 padding = 0) {
+    KNF_CacheCleanup();
     std::string path = testing::TempDir() + "snapshot-" + std::to_string(getpid());
     std::ofstream(path, std::ios::binary) << file;
     EXPECT_EQ(truncate(path.c_str(), static_cast<off_t>(file.size() + padding)), 0);
@@ -34,8 +38,7 @@ KnfStatus Parse(const std::string &file) {
 }
 
 KnfStatus Get(uint32_t node, const Params &keys, std::string *record) {
-    KnfParamListRec list = {KNF_INSTANCE_LIST, 2, keys};
-    return KNF_Get(node, &list, record->data(), static_cast<uint32_t>(record->size()));
+    return KNF_Get(node, KeysOf(keys).get(), record->data(), static_cast<uint32_t>(record->size()));
 }
 
 const Params PORT = {ParamOf("s"), ParamOf(int64_t{5})};
@@ -95,6 +98,7 @@ TEST(Snapshot, BadFilesAreToldApartAndNothingIsServed) {
         std::string record(100, '\0');
         EXPECT_EQ(Use(good), STATUS_OK);
         EXPECT_EQ(Get(269, PORT, &record), STATUS_OK);
+        KNF_CacheCleanup();
         KnfStatus status = file[0] == '/' ? KNF_UseCache(file.c_str(), 0) : Use(file, padding);
         EXPECT_STREQ(HCK_ReturnStatusToString(status), text);
         const char *ours = nullptr;
@@ -153,16 +157,15 @@ TEST(Snapshot, EveryInstanceIsFoundAmongManyPages) {
     for (int64_t i = 0; i < 10000; i += 3) {
         int64_t port = i * 7919 % 10000 * 2 - 1;
         std::string record(708, '\0');
-        KnfParamListRec key = {KNF_INSTANCE_LIST, 1, {ParamOf(port)}};
+        List key = KeysOf({ParamOf(port)});
         failingNew = static_cast<int>(i % 16);
-        KNF_Get(269, &key, record.data(), 708);
+        KNF_Get(269, key.get(), record.data(), 708);
         failingNew = 0;
         ASSERT_EQ(Get(269, {ParamOf(port)}, &record), STATUS_OK) << port << ", for which memory was short before";
         ASSERT_EQ(record, draft.entries[SnapshotName(ENTRY_RECORD, 269, {ParamOf(port)})]);
     }
-    KnfParamListRec key = {KNF_INSTANCE_LIST, 1, {ParamOf(int64_t{10001})}};
     KnfParamList list = nullptr;
-    ASSERT_EQ(KNF_GetInstanceListAlloc(269, &key, &list), STATUS_OK);
+    ASSERT_EQ(KNF_GetInstanceListAlloc(269, KeysOf({ParamOf(int64_t{10001})}).get(), &list), STATUS_OK);
     KNF_CacheCleanup();
     EXPECT_EQ(KNF_ParamListUsedCount(list), 100000U) << "lists outlive their snapshot";
     EXPECT_EQ(KNF_ParamGetInt(KNF_ParamListGetParam(list, 99999)), 99999);

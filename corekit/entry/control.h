@@ -14,6 +14,10 @@ struct CorekitCounts {
     uint64_t set = 0;
     uint64_t create = 0;
     uint64_t add = 0;
+    uint64_t text = 0;  // KNF_ParamListGetString
+    uint64_t signature = 0;
+    uint64_t cache = 0;  // KNF_UseCache
+    uint64_t alive = 0;  // lists that were made and not destroyed; no reset changes it
 };
 
 // Replaces the host, all faults and all counts by those of a description. On false `*error` (may be null) holds
@@ -28,6 +32,9 @@ COREKIT_EXPORTED bool CorekitFault(const std::string &lines, std::string *error 
 
 COREKIT_EXPORTED CorekitCounts CorekitCallCounts();
 COREKIT_EXPORTED void CorekitResetCounts();
+
+// Check mode, as COREKIT_CHECK has it. Switch it while no list is alive.
+COREKIT_EXPORTED void CorekitCheck(bool on);
 
 // While on, every call is kept as the text of its trace line. Switching on or off clears the record.
 COREKIT_EXPORTED void CorekitRecord(bool on);

@@ -37,17 +37,44 @@ bool Matches(const FaultRule &rule, const FaultCall &call) {
 }
 
 u32 TakeCalls(Line *line) {
-    const std::pair<const char *, u32> calls[] = {{"get", 1U << CALL_GET}, {"list", 1U << CALL_LIST},
-                                                  {"set", 1U << CALL_SET}, {"create", 1U << CALL_CREATE},
-                                                  {"add", 1U << CALL_ADD}, {"any", (1U << CALL_KINDS) - 1}};
-    std::string name = TakePlain(line, "get, list, set, create, add or any").text;
+    const std::pair<const char *, u32> calls[] = {{"get", 1U << CALL_GET},
+                                                  {"list", 1U << CALL_LIST},
+                                                  {"set", 1U << CALL_SET},
+                                                  {"create", 1U << CALL_CREATE},
+                                                  {"add", 1U << CALL_ADD},
+                                                  {"text", 1U << CALL_TEXT},
+                                                  {"signature", 1U << CALL_SIGNATURE},
+                                                  {"cache", 1U << CALL_CACHE},
+                                                  {"any", (1U << CALL_KINDS) - 1}};
+    constexpr char expected[] = "get, list, set, create, add, text, signature, cache or any";
+    std::string name = TakePlain(line, expected).text;
     for (const auto &[known, bits] : calls) {
         if (name == known) {
             return bits;
         }
     }
-    Fail(line, "call " + Quoted(name) + ": expected get, list, set, create, add or any");
+    Fail(line, "call " + Quoted(name) + ": expected " + expected);
     return 0;
+}
+
+// How many calls fail, and how.
+void TakeOutcome(Line *line, FaultRule *rule) {
+    rule->nth = static_cast<u64>(TakeNumber(line, "nth", 0, 1, MAX_I64));
+    auto from = static_cast<u64>(TakeNumber(line, "from", 0, 1, MAX_I64));
+    auto status = static_cast<KnfStatus>(TakeNumber(line, "status", 0, 1, MAX_ID));
+    rule->delay = static_cast<u32>(TakeNumber(line, "delay", 0, 1, 60000));
+    rule->signal = static_cast<int>(TakeNumber(line, "signal", 0, 1, 64));
+    if (rule->nth != 0 && from != 0) {
+        Fail(line, "nth= and from=: expected one of them");
+    }
+    if (rule->signal != 0 && status != 0) {
+        Fail(line, "signal= and status=: expected one of them, as a call that a signal meets succeeds");
+    }
+    if (rule->signal != 0 && rule->delay != 0) {
+        Fail(line, "signal= and delay=: expected one of them");
+    }
+    rule->from = from != 0 ? from : 1;
+    rule->status = status != 0 ? status : STATUS_SIMULATED;
 }
 
 }  // namespace
@@ -78,8 +105,8 @@ void FaultsTake(Line *line, std::vector<FaultRule> *rules) {
         rule.hasNode = true;
         rule.node = TakeNode(line);
         rule.keys = TakeKeys(line);
-        if (rule.calls == 1U << CALL_CREATE || rule.calls == 1U << CALL_ADD) {
-            Fail(line, "node too many: expected none for create and add");
+        if ((rule.calls & (1U << CALL_GET | 1U << CALL_LIST | 1U << CALL_SET)) == 0) {
+            Fail(line, "node too many: expected one for get, list, set and any alone");
         }
     }
     if (std::optional<Word> added = Take(line, "key")) {
@@ -89,11 +116,7 @@ void FaultsTake(Line *line, std::vector<FaultRule> *rules) {
             Fail(line, "key= too many: expected it for add alone");
         }
     }
-    rule.nth = static_cast<u64>(TakeNumber(line, "nth", 0, 1, MAX_I64));
-    rule.from = static_cast<u64>(TakeNumber(line, "from", 1, 1, MAX_I64));
-    rule.status = static_cast<KnfStatus>(TakeNumber(line, "status", STATUS_SIMULATED, 1, MAX_ID));
-    rule.delay = static_cast<u32>(TakeNumber(line, "delay", 0, 1, 60000));
-    rule.signal = static_cast<int>(TakeNumber(line, "signal", 0, 1, 64));
+    TakeOutcome(line, &rule);
     if (Complete(line)) {
         rules->push_back(std::move(rule));
     }

@@ -8,7 +8,17 @@
 
 struct Line;
 
-enum CallKind : uint8_t { CALL_GET, CALL_LIST, CALL_SET, CALL_CREATE, CALL_ADD, CALL_KINDS };
+enum CallKind : uint8_t {
+    CALL_GET,
+    CALL_LIST,
+    CALL_SET,  // these three have a node
+    CALL_CREATE,
+    CALL_ADD,
+    CALL_TEXT,
+    CALL_SIGNATURE,
+    CALL_CACHE,
+    CALL_KINDS
+};
 
 struct FaultRule {
     uint32_t calls = 0;  // bit 1 << CallKind

@@ -1,10 +1,12 @@
 #include "corekit/entry/journal.h"
 
+#include "corekit/entry/setting.h"
+
 #include <cerrno>
 #include <cstdio>
-#include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
+#include <new>
 #include <unistd.h>
 #include <utility>
 
@@ -18,8 +20,8 @@ struct Journal {
 };
 
 int OpenNamed(const char *variable) {
-    const char *path = getenv(variable);
-    if (path == nullptr || *path == 0) {
+    const char *path = Setting(variable);
+    if (path == nullptr) {
         return -1;
     }
     int fd = open(path, O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0644);
@@ -43,9 +45,16 @@ void WriteLine(int fd, const std::string &line) {
 
 }  // namespace
 
-bool JournalWanted(bool isSet) {
-    const Journal &journal = TheJournal();
-    return journal.recording || journal.traceFd >= 0 || (isSet && journal.setFd >= 0);
+bool journalSilent = false;
+
+bool JournalAsked(bool isSet) {
+    try {
+        const Journal &journal = TheJournal();
+        journalSilent = !journal.recording && journal.traceFd < 0 && journal.setFd < 0;
+        return journal.recording || journal.traceFd >= 0 || (isSet && journal.setFd >= 0);
+    } catch (const std::bad_alloc &) {
+        return false;
+    }
 }
 
 void JournalLine(bool isSet, std::string line) {
@@ -61,6 +70,7 @@ void JournalLine(bool isSet, std::string line) {
 void JournalRecord(bool on) {
     Journal &journal = TheJournal();
     journal.recording = on;
+    journalSilent = false;
     journal.recorded.clear();
 }
 
@@ -68,8 +78,8 @@ const std::vector<std::string> &JournalRecorded() {
     return TheJournal().recorded;
 }
 
-std::string CallText(const char *name, const uint32_t *node, const Params &keys, const Params *input,
-                     KnfStatus status) {
+std::string CallText(const char *name, const uint32_t *node, const Params &keys, const Params *input, KnfStatus status,
+                     uint32_t list) {
     std::string line = name;
     if (node != nullptr) {
         line += ' ' + std::to_string(*node);
@@ -87,5 +97,6 @@ std::string CallText(const char *name, const uint32_t *node, const Params &keys,
     }
     char end[24];
     snprintf(end, sizeof end, " -> %#x", status);
-    return line + (status == 0 ? " -> 0x0" : end);
+    line += status == 0 ? " -> 0x0" : end;
+    return list != 0 ? line + " #" + std::to_string(list) : line;
 }

@@ -7,12 +7,17 @@
 #include <string>
 #include <vector>
 
+extern bool journalSilent;  // known to have no reader
+bool JournalAsked(bool isSet);
 // True when some reader wants a line of this call. Cheap; callers build the line only then.
-bool JournalWanted(bool isSet);
+inline bool JournalWanted(bool isSet) {
+    return !journalSilent && JournalAsked(isSet);
+}
 void JournalLine(bool isSet, std::string line);
 
 void JournalRecord(bool on);  // starts with an empty record
 const std::vector<std::string> &JournalRecorded();
 
-// "NAME [NODE] KEYS... [: INPUT...] -> 0xSTATUS"
-std::string CallText(const char *name, const uint32_t *node, const Params &keys, const Params *input, KnfStatus status);
+// "NAME [NODE] KEYS... [: INPUT...] -> 0xSTATUS [#LIST]"; no list has the number 0.
+std::string CallText(const char *name, const uint32_t *node, const Params &keys, const Params *input, KnfStatus status,
+                     uint32_t list);

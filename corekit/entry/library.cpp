@@ -1,58 +1,21 @@
 // The C entry points: argument checks, faults, counts and journal around the current source of nodes.
+#include "corekit/entry/library.h"
 #include "corekit/entry/control.h"
-#include "corekit/entry/faults.h"
 #include "corekit/entry/format.h"
-#include "corekit/entry/journal.h"
-#include "corekit/linuxhost/source.h"
-#include "corekit/node_source.h"
+#include "corekit/entry/setting.h"
 #include "corekit/simulated/default_host.h"
 #include "corekit/simulated/description.h"
-#include "corekit/simulated/host.h"
-#include "corekit/snapshot/snapshot.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <cstdio>
-#include <cstdlib>
 #include <cstring>
 #include <iterator>
-#include <memory>
-#include <new>
-#include <optional>
 #include <utility>
 
 namespace {
 
-struct LinuxHostCloser {
-    void operator()(LinuxHost *host) const { LinuxHostClose(host); }
-};
-
-struct Library {
-    std::unique_ptr<Host> host;  // at most one of these two
-    std::unique_ptr<LinuxHost, LinuxHostCloser> machine;
-    NodeSource live = {};                // of it; its functions are null while nothing is connected
-    std::unique_ptr<Snapshot> snapshot;  // the one in use
-    NodeSource cache = {};
-    const NodeSource *current = nullptr;  // what reads are served from; null while nothing is connected
-    bool loadedByControl = false;
-    std::vector<FaultRule> faults;
-    std::optional<bool> namedFaults;  // whether COREKIT_FAULTS could be used, once it was looked at
-    uint64_t calls[CALL_KINDS] = {};
-};
-
-constexpr int SCRIBBLE = 0xa5;  // what a refused read leaves in the record: nobody may use it
-
-// Never destroyed: calls may still come while the process ends.
-Library &Lib() {
-    static auto *library = new Library;
-    return *library;
-}
-
-KnfStatus CheckCall(const FaultCall &call) {
-    Library &library = Lib();
-    library.calls[call.kind]++;
-    return library.faults.empty() ? STATUS_OK : FaultsCheck(&library.faults, call);
-}
+constexpr int SCRIBBLE = 0xa5;  // what a call that failed leaves in the caller's buffer: nobody may use it
 
 KnfStatus CheckInstance(const FaultCall &call) {
     KnfStatus status = CheckCall(call);
@@ -65,51 +28,29 @@ KnfStatus CheckInstance(const FaultCall &call) {
     return status;
 }
 
-KnfStatus Told(KnfStatus status, const char *name, const uint32_t *node, const Params &keys,
-               const Params *input = nullptr) {
-    if (JournalWanted(input != nullptr)) {
-        JournalLine(input != nullptr, CallText(name, node, keys, input, status));
+void CheckInit(const Params &arguments) {
+    const Library &library = Lib();
+    if (!std::equal(arguments.begin(), arguments.end(), std::begin({1, 0, 0}),
+                    [](const KnfParamRec &given, int expected) { return given.number == expected; })) {
+        Misuse("HckSyscall_Init", nullptr, arguments, "expected 1 0 0");
+    }
+    if (library.initialised || library.replaying) {
+        Misuse("HckSyscall_Init", nullptr, arguments, library.replaying ? "during a replay" : "a second time");
+    }
+}
+
+void CheckUseCache(const std::string &path, uint32_t flags) {
+    if (flags != 0 || Lib().replaying) {
+        Misuse("KNF_UseCache", nullptr, {ParamOf(path), ParamOf(flags)},
+               flags != 0 ? "expected flags 0" : "a second time without KNF_CacheCleanup");
+    }
+}
+
+KnfStatus Scribbled(KnfStatus status, void *buffer, uint32_t size) {
+    if (status != STATUS_OK && buffer != nullptr) {
+        memset(buffer, SCRIBBLE, size);
     }
     return status;
-}
-
-// No exception leaves the library: memory that is exhausted is a failed call.
-template <typename Result, typename Body>
-Result Contained(Result failed, Body body) {
-    try {
-        return body();
-    } catch (const std::bad_alloc &) {
-        return failed;
-    }
-}
-
-KnfStatus AddParam(KnfParamList list, KnfParamRec param) {
-    KnfStatus status = CheckCall({CALL_ADD, 0, nullptr, &param});
-    const NodeSource *source = Lib().current;
-    if (status == STATUS_OK && source != nullptr && source->withoutHistograms && param.isText && list != nullptr &&
-        list->kind == KNF_INPUT_LIST) {
-        status = STATUS_NOT_WRITABLE;
-    }
-    Params told;
-    if (JournalWanted(false)) {
-        told = {param};
-    }
-    if (status == STATUS_OK) {
-        status = ParamListAdd(list, std::move(param));
-    }
-    if (!told.empty()) {
-        Told(status, "add", nullptr, told);
-    }
-    return status;
-}
-
-// Null past the end, where a caller that counts right never looks.
-KnfParamRec *Entry(KnfParamList list, uint32_t index) {
-    KnfParamRec *param = ParamListAt(list, index);
-    if (param == nullptr) {
-        Contained(STATUS_BAD_PARAM, [&] { return Told(STATUS_BAD_PARAM, "beyond", nullptr, {ParamOf(index)}); });
-    }
-    return param;
 }
 
 bool Load(const std::string &text, const char *file, std::string *error) {
@@ -135,7 +76,6 @@ void LoadMachine() {
     library.current = &library.live;
 }
 
-// A file that opens and can't be read, as a directory, is an empty one.
 bool ReadNamed(const char *path, const char *expected, std::string *text) {
     FILE *file = fopen(path, "re");
     if (file == nullptr) {
@@ -147,8 +87,12 @@ bool ReadNamed(const char *path, const char *expected, std::string *text) {
     for (size_t length; (length = fread(piece, 1, sizeof piece, file)) > 0;) {
         text->append(piece, length);
     }
+    bool whole = ferror(file) == 0;  // a directory opens and can't be read
+    if (!whole) {
+        fprintf(stderr, "%s: %s: expected %s\n", path, strerror(errno), expected);
+    }
     fclose(file);
-    return true;
+    return whole;
 }
 
 bool LoadDescribed(const char *path) {
@@ -166,8 +110,8 @@ bool LoadDescribed(const char *path) {
 
 // This machine, unless COREKIT_HOST names another host.
 bool LoadNamed() {
-    const char *path = getenv("COREKIT_HOST");
-    if (path != nullptr && *path != 0) {
+    const char *path = Setting("COREKIT_HOST");
+    if (path != nullptr) {
         return LoadDescribed(path);
     }
     LoadMachine();
@@ -187,9 +131,9 @@ bool AddFaults(const std::string &lines, const char *file, std::string *error) {
 // Faults of a file, for whatever source connects. One that can't be used connects none, so that no test passes for want
 // of its faults.
 bool AddNamedFaults() {
-    const char *path = getenv("COREKIT_FAULTS");
+    const char *path = Setting("COREKIT_FAULTS");
     std::optional<bool> *usable = &Lib().namedFaults;
-    if (!usable->has_value() && path != nullptr && *path != 0) {
+    if (!usable->has_value() && path != nullptr) {
         std::string text;
         std::string error;
         *usable = ReadNamed(path, "a readable file of faults", &text) && AddFaults(text, path, &error);
@@ -204,9 +148,13 @@ bool AddNamedFaults() {
 
 extern "C" {
 
-int HckSyscall_Init(int, int, int) {
+int HckSyscall_Init(int mode, int flags, int reserved) {
     return Contained(-1, [&] {
         Library &library = Lib();
+        if (checkMode) [[unlikely]] {
+            CheckInit({ParamOf(mode), ParamOf(flags), ParamOf(reserved)});
+        }
+        library.initialised = true;
         bool connected = library.loadedByControl || LoadNamed();
         if (connected && !AddNamedFaults()) {
             connected = false;
@@ -223,36 +171,51 @@ const char *HCK_ReturnStatusToString(KnfStatus status) {
 }
 
 KnfStatus KNF_CheckSig(char *kernelSig, uint32_t size, const char **programSig) {
-    const NodeSource *source = Lib().current;
-    const char *kernel = source != nullptr ? source->signature(source->context) : "";
-    if (kernelSig != nullptr && size > 0) {
-        size_t length = strlen(kernel);
-        memset(kernelSig, 0, size);
-        memcpy(kernelSig, kernel, length < size ? length : size);
-    }
-    if (programSig != nullptr) {
-        *programSig = HOST_SIGNATURE;
-    }
-    KnfStatus differs = strcmp(kernel, HOST_SIGNATURE) == 0 ? STATUS_OK : STATUS_BAD_SIGNATURE;
-    return Told(source == nullptr ? STATUS_NOT_CONNECTED : differs, "signature", nullptr, {});
+    return Contained(KNF_FAILURE, [&] {
+        if (checkMode && size != KNF_SIGNATURE_SIZE) [[unlikely]] {
+            Misuse("KNF_CheckSig", nullptr, {ParamOf(size)}, "expected a size of 21");
+        }
+        const NodeSource *source = Lib().current;
+        const char *kernel = source != nullptr ? source->signature(source->context) : "";
+        if (kernelSig != nullptr && size > 0) {
+            size_t length = strlen(kernel);
+            memset(kernelSig, 0, size);
+            memcpy(kernelSig, kernel, length < size ? length : size);
+        }
+        if (programSig != nullptr) {
+            *programSig = HOST_SIGNATURE;
+        }
+        KnfStatus status = CheckCall({CALL_SIGNATURE});
+        if (status == STATUS_OK) {
+            KnfStatus differs = strcmp(kernel, HOST_SIGNATURE) == 0 ? STATUS_OK : STATUS_BAD_SIGNATURE;
+            status = source == nullptr ? STATUS_NOT_CONNECTED : differs;
+        }
+        return Told(status, "signature", nullptr, {});
+    });
 }
 
 KnfStatus KNF_Get(uint32_t node, KnfParamList instance, void *record, uint32_t size) {
-    return Contained(KNF_FAILURE, [&] {
+    KnfStatus got = Contained(KNF_FAILURE, [&] {
+        if (checkMode) [[unlikely]] {
+            CheckList("KNF_Get", &node, instance);
+        }
         KnfStatus status = CheckInstance({CALL_GET, node, instance});
         const Params &keys = ParamListParams(instance);
         if (status == STATUS_OK) {
             const NodeSource *source = Lib().current;
             status = record == nullptr ? STATUS_BAD_PARAM : source->get(source->context, node, keys, record, size);
-        } else if (record != nullptr) {
-            memset(record, SCRIBBLE, size);
         }
         return Told(status, "get", &node, keys);
     });
+    return Scribbled(got, record, size);
 }
 
 KnfStatus KNF_Set(uint32_t node, KnfParamList instance, KnfParamList input, void *result, uint32_t size) {
-    return Contained(KNF_FAILURE, [&] {
+    KnfStatus done = Contained(KNF_FAILURE, [&] {
+        if (checkMode) [[unlikely]] {
+            CheckList("KNF_Set", &node, instance);
+            CheckList("KNF_Set", &node, input);
+        }
         KnfStatus status = CheckInstance({CALL_SET, node, instance});
         const Params &keys = ParamListParams(instance);
         const Params &arguments = ParamListParams(input);
@@ -266,10 +229,15 @@ KnfStatus KNF_Set(uint32_t node, KnfParamList instance, KnfParamList input, void
         }
         return Told(status, "set", &node, keys, &arguments);
     });
+    return Scribbled(done, result, size);
 }
 
 KnfStatus KNF_GetInstanceListAlloc(uint32_t node, KnfParamList instance, KnfParamList *list) {
     return Contained(KNF_FAILURE, [&] {
+        if (checkMode) [[unlikely]] {
+            CheckList("KNF_GetInstanceListAlloc", &node, instance);
+            CheckOverwritten(node, ParamListParams(instance), list != nullptr ? *list : nullptr);
+        }
         KnfStatus status = CheckInstance({CALL_LIST, node, instance});
         const Params &keys = ParamListParams(instance);
         Params entries;
@@ -277,84 +245,32 @@ KnfStatus KNF_GetInstanceListAlloc(uint32_t node, KnfParamList instance, KnfPara
             const NodeSource *source = Lib().current;
             status = list == nullptr ? STATUS_BAD_PARAM : source->list(source->context, node, keys, &entries);
         }
-        if (status == STATUS_OK) {
-            *list = ParamListFrom(entries);
+        KnfParamList made = status == STATUS_OK ? ParamListFrom(node, std::move(entries)) : nullptr;
+        if (checkMode && made != nullptr) [[unlikely]] {
+            CheckMade(made, keys);
         }
-        return Told(status, "list", &node, keys);
-    });
-}
-
-KnfParamList KNF_ParamListCreate(uint32_t kind, uint32_t capacity) {
-    return Contained(KnfParamList{nullptr}, [&] {
-        KnfStatus status = CheckCall({CALL_CREATE});
-        KnfParamList list = status == STATUS_OK ? ParamListCreate(kind, capacity) : nullptr;
-        if (status == STATUS_OK && list == nullptr) {
-            status = STATUS_BAD_PARAM;
+        if (made != nullptr) {
+            *list = made;
         }
-        if (JournalWanted(false)) {
-            Told(status, "create", nullptr, {ParamOf(kind), ParamOf(capacity)});
-        }
-        return list;
+        return Told(status, "list", &node, keys, nullptr, made != nullptr ? made->id : 0);
     });
-}
-
-KnfStatus KNF_ParamListAddInt(KnfParamList list, int64_t value) {
-    return Contained(KNF_FAILURE, [&] { return AddParam(list, ParamOf(value)); });
-}
-
-KnfStatus KNF_ParamListAddString(KnfParamList list, const char *text) {
-    return Contained(KNF_FAILURE, [&] {
-        return text == nullptr ? Told(STATUS_BAD_PARAM, "add", nullptr, {})
-                               : AddParam(list, ParamOf(std::string(text)));
-    });
-}
-
-void KNF_ParamListRemoveLastParam(KnfParamList list) {
-    if (JournalWanted(false)) {
-        const Params &params = ParamListParams(list);
-        Told(STATUS_OK, "remove", nullptr, params.empty() ? params : Params{params.back()});
-    }
-    ParamListRemoveLast(list);
-}
-
-uint32_t KNF_ParamListUsedCount(KnfParamList list) {
-    return static_cast<uint32_t>(ParamListParams(list).size());
-}
-
-KnfParam KNF_ParamListGetParam(KnfParamList list, uint32_t index) {
-    return Entry(list, index);
-}
-
-int64_t KNF_ParamGetInt(KnfParam param) {
-    return param != nullptr ? param->number : 0;
-}
-
-const char *KNF_ParamGetString(KnfParam param) {
-    return param != nullptr ? param->text.c_str() : "";
-}
-
-KnfStatus KNF_ParamListGetString(KnfParamList list, uint32_t index, const char **text) {
-    const KnfParamRec *param = Entry(list, index);
-    if (param == nullptr || !param->isText || text == nullptr) {
-        return STATUS_BAD_PARAM;
-    }
-    *text = param->text.c_str();
-    return STATUS_OK;
-}
-
-void KNF_ParamListDestroy(KnfParamList list) {
-    Told(STATUS_OK, list != nullptr ? "destroy" : "destroy-null", nullptr, ParamListParams(list));
-    delete list;
 }
 
 // A file that can't be used leaves nothing to read, neither the snapshot before it nor the kernel.
-KnfStatus KNF_UseCache(const char *path, uint32_t) {
+KnfStatus KNF_UseCache(const char *path, uint32_t flags) {
     return Contained(KNF_FAILURE, [&] {
         Library &library = Lib();
         std::string name = path != nullptr ? path : "";
+        if (checkMode) [[unlikely]] {
+            CheckUseCache(name, flags);
+        }
+        library.replaying = true;
         library.current = nullptr;
         library.snapshot = std::make_unique<Snapshot>();
-        KnfStatus status = AddNamedFaults() ? SnapshotOpen(name.c_str(), library.snapshot.get()) : STATUS_NOT_CONNECTED;
+        KnfStatus status = AddNamedFaults() ? CheckCall({CALL_CACHE}) : STATUS_NOT_CONNECTED;
+        if (status == STATUS_OK) {
+            status = SnapshotOpen(name.c_str(), library.snapshot.get());
+        }
         if (status == STATUS_OK) {
             library.cache = SnapshotSource(library.snapshot.get());
             library.current = &library.cache;
@@ -367,10 +283,13 @@ KnfStatus KNF_UseCache(const char *path, uint32_t) {
 
 // Reads go to the kernel again, if the process is connected to it.
 KnfStatus KNF_CacheCleanup(void) {
-    Library &library = Lib();
-    library.snapshot = nullptr;
-    library.current = library.live.get != nullptr ? &library.live : nullptr;
-    return Told(STATUS_OK, "cache-cleanup", nullptr, {});
+    return Contained(KNF_FAILURE, [] {
+        Library &library = Lib();
+        library.replaying = false;
+        library.snapshot = nullptr;
+        library.current = library.live.get != nullptr ? &library.live : nullptr;
+        return Told(STATUS_OK, "cache-cleanup", nullptr, {});
+    });
 }
 
 int Str_Vsnprintf(char *buffer, size_t size, const char *format, va_list arguments) {
@@ -412,11 +331,16 @@ bool CorekitFault(const std::string &lines, std::string *error) {
 
 CorekitCounts CorekitCallCounts() {
     const uint64_t *calls = Lib().calls;
-    return {calls[CALL_GET], calls[CALL_LIST], calls[CALL_SET], calls[CALL_CREATE], calls[CALL_ADD]};
+    return {calls[CALL_GET],  calls[CALL_LIST],      calls[CALL_SET],   calls[CALL_CREATE], calls[CALL_ADD],
+            calls[CALL_TEXT], calls[CALL_SIGNATURE], calls[CALL_CACHE], ParamListsAlive()};
 }
 
 void CorekitResetCounts() {
     std::fill(std::begin(Lib().calls), std::end(Lib().calls), uint64_t{0});
+}
+
+void CorekitCheck(bool on) {
+    CheckSwitch(on);
 }
 
 void CorekitRecord(bool on) {

@@ -5,23 +5,47 @@
 namespace {
 
 constexpr uint32_t MAX_CAPACITY = 65536;
+uint32_t made = 0;
+uint64_t alive = 0;
+
+KnfParamListRec *Count(KnfParamListRec *list) {
+    list->id = ++made;
+    alive++;
+    return list;
+}
 
 }  // namespace
+
+const Params &noParams = *new Params;  // never destroyed: calls may still come while the process ends
 
 KnfParamListRec *ParamListCreate(uint32_t kind, uint32_t capacity) {
     if ((kind != KNF_INPUT_LIST && kind != KNF_INSTANCE_LIST) || capacity > MAX_CAPACITY) {
         return nullptr;
     }
-    auto *list = new KnfParamListRec{kind, capacity, {}};
-    list->params.reserve(capacity);
-    return list;
+    Params params;
+    params.reserve(capacity);
+    return Count(new KnfParamListRec{kind, capacity, 0, 0, std::move(params)});
 }
 
-KnfParamListRec *ParamListFrom(const Params &params) {
-    return new KnfParamListRec{KNF_INSTANCE_LIST, static_cast<uint32_t>(params.size()), params};
+KnfParamListRec *ParamListFrom(uint32_t node, Params params) {
+    auto capacity = static_cast<uint32_t>(params.size());
+    return Count(new KnfParamListRec{KNF_INSTANCE_LIST, capacity, 0, node, std::move(params)});
 }
 
-KnfStatus ParamListAdd(KnfParamListRec *list, KnfParamRec param) {
+void ParamListDestroy(KnfParamListRec *list) {
+    ParamListRetire(list);
+    delete list;
+}
+
+void ParamListRetire(KnfParamListRec *list) {
+    alive -= list != nullptr ? 1 : 0;
+}
+
+uint64_t ParamListsAlive() {
+    return alive;
+}
+
+KnfStatus ParamListAdd(KnfParamListRec *list, KnfParamRec &&param) {
     if (list == nullptr) {
         return KNF_FAILURE;
     }
@@ -36,13 +60,4 @@ void ParamListRemoveLast(KnfParamListRec *list) {
     if (list != nullptr && !list->params.empty()) {
         list->params.pop_back();
     }
-}
-
-KnfParamRec *ParamListAt(KnfParamListRec *list, uint32_t index) {
-    return list != nullptr && index < list->params.size() ? &list->params[index] : nullptr;
-}
-
-const Params &ParamListParams(const KnfParamListRec *list) {
-    static const Params none;
-    return list != nullptr ? list->params : none;
 }

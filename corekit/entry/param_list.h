@@ -7,13 +7,25 @@
 struct KnfParamListRec {
     uint32_t kind;
     uint32_t capacity;
+    uint32_t id;    // counts the lists of the process, from 1 on
+    uint32_t node;  // whose instances it lists; 0 for a list that its user made
     Params params;  // reserved to capacity: entries stay where they are until they are removed
 };
 
 // Null for an unknown kind or an absurd capacity.
 KnfParamListRec *ParamListCreate(uint32_t kind, uint32_t capacity);
-KnfParamListRec *ParamListFrom(const Params &params);  // an instance list
-KnfStatus ParamListAdd(KnfParamListRec *list, KnfParamRec param);
+KnfParamListRec *ParamListFrom(uint32_t node, Params params);  // an instance list
+void ParamListDestroy(KnfParamListRec *list);
+void ParamListRetire(KnfParamListRec *list);  // is alive no more, but not freed yet
+uint64_t ParamListsAlive();
+// Takes the parameter only on 0.
+KnfStatus ParamListAdd(KnfParamListRec *list, KnfParamRec &&param);
 void ParamListRemoveLast(KnfParamListRec *list);
-KnfParamRec *ParamListAt(KnfParamListRec *list, uint32_t index);
-const Params &ParamListParams(const KnfParamListRec *list);  // a null list has none
+inline KnfParamRec *ParamListAt(KnfParamListRec *list, uint32_t index) {
+    return list != nullptr && index < list->params.size() ? &list->params[index] : nullptr;
+}
+
+extern const Params &noParams;
+inline const Params &ParamListParams(const KnfParamListRec *list) {
+    return list != nullptr ? list->params : noParams;
+}

@@ -110,11 +110,8 @@ std::string_view Read(Recorder *recorder, u32 node, const Params &keys) {
     return recorder->draft.entries[name] = std::move(record);
 }
 
-// What a list's entries are; the interface does not tell.
-enum EntryType : u8 { NUMBERS, TEXTS };
-
 // Nothing for a list that was read before, as what it leads to was read then.
-Params List(Recorder *recorder, u32 node, const Params &keys, EntryType type) {
+Params List(Recorder *recorder, u32 node, const Params &keys) {
     Params entries;
     std::string name = SnapshotName(ENTRY_LIST, node, keys);
     if (!Wanted(*recorder, name)) {
@@ -127,8 +124,8 @@ Params List(Recorder *recorder, u32 node, const Params &keys, EntryType type) {
         std::string &body = recorder->draft.entries[name];
         for (u32 i = 0; i < count; i++) {
             KnfParam entry = KNF_ParamListGetParam(list, i);
-            entries.push_back(type == TEXTS ? ParamOf(std::string(KNF_ParamGetString(entry)))
-                                            : ParamOf(KNF_ParamGetInt(entry)));
+            entries.push_back(NodeEntries(node) == TEXTS ? ParamOf(std::string(KNF_ParamGetString(entry)))
+                                                         : ParamOf(KNF_ParamGetInt(entry)));
             SnapshotAppendParam(&body, entries.back());
         }
     }
@@ -172,7 +169,7 @@ void RecordVcpus(Recorder *recorder, u64 id) {
         }
         id = FieldOf(link, next);
     }
-    for (const KnfParamRec &vcpu : List(recorder, NODE_VCPU_LIST, {Key(id)}, NUMBERS)) {
+    for (const KnfParamRec &vcpu : List(recorder, NODE_VCPU_LIST, {Key(id)})) {
         ReadScope(recorder, VCPU, {vcpu});
     }
 }
@@ -185,7 +182,7 @@ void RecordNic(Recorder *recorder, const KnfParamRec &nic) {
     }
     queues = FieldOf(Known(*recorder, NODE_RXQ_INFO, {nic}), queue_info::COUNT);
     for (u64 queue = 0; queue < queues; queue++) {
-        for (const KnfParamRec &filter : List(recorder, NODE_RXQ_FILTERS, {nic, Key(queue)}, NUMBERS)) {
+        for (const KnfParamRec &filter : List(recorder, NODE_RXQ_FILTERS, {nic, Key(queue)})) {
             Read(recorder, NODE_RXQ_FILTER, {nic, Key(queue), filter});
         }
     }
@@ -215,10 +212,10 @@ void RecordPort(Recorder *recorder, const KnfParamRec &port) {
 }  // namespace
 
 void RecordHost(Recorder *recorder) {
-    char signature[SNAPSHOT_SIGNATURE] = {};
+    char signature[KNF_SIGNATURE_SIZE + 1] = {};
     const char *ours = "";
-    if (KNF_CheckSig(signature, sizeof signature - 1, &ours) == 0 && signature[0] == 0) {
-        strncpy(signature, ours, sizeof signature - 1);  // a library that tells the kernel's only when they differ
+    if (KNF_CheckSig(signature, KNF_SIGNATURE_SIZE, &ours) == 0 && signature[0] == 0) {
+        strncpy(signature, ours, KNF_SIGNATURE_SIZE);  // a library that tells the kernel's only when they differ
     }
     recorder->draft.signature = signature;
     ReadScope(recorder, HOST, {});
@@ -229,16 +226,16 @@ void RecordHost(Recorder *recorder) {
     for (u64 pcpu = 0; pcpu < pcpus; pcpu++) {
         ReadScope(recorder, PCPU, {Key(pcpu)});
     }
-    for (const KnfParamRec &name : List(recorder, NODE_SWITCH_LIST, {}, TEXTS)) {
-        for (const KnfParamRec &port : List(recorder, NODE_SWITCH_PORTS, {name}, NUMBERS)) {
+    for (const KnfParamRec &name : List(recorder, NODE_SWITCH_LIST, {})) {
+        for (const KnfParamRec &port : List(recorder, NODE_SWITCH_PORTS, {name})) {
             RecordPort(recorder, port);
         }
     }
-    for (const KnfParamRec &name : List(recorder, NODE_WORLDLET_LIST, {}, TEXTS)) {
+    for (const KnfParamRec &name : List(recorder, NODE_WORLDLET_LIST, {})) {
         Read(recorder, NODE_WORLDLET_STATS, {name});
     }
-    for (const KnfParamRec &vector : List(recorder, NODE_VECTOR_LIST, {}, NUMBERS)) {
-        List(recorder, NODE_VECTOR_NAMES, {vector}, TEXTS);
+    for (const KnfParamRec &vector : List(recorder, NODE_VECTOR_LIST, {})) {
+        List(recorder, NODE_VECTOR_NAMES, {vector});
         for (u64 pcpu = 0; pcpu < pcpus; pcpu++) {
             Read(recorder, NODE_VECTOR_STATS, {vector, Key(pcpu)});
         }

@@ -6,8 +6,17 @@
 
 namespace {
 
-constexpr i64 MAX_COUNT = 10000000;
 constexpr i64 MAX_RECORD = 1 << 20;
+constexpr i64 MAX_REPEATS = 1000000;     // lines that all count= of a description stand for
+constexpr size_t MAX_ENTRIES = 4000000;  // records and instance lists of a host
+
+// Shares of one and the same time.
+void RequireShares(Line *line, const char *names, i64 sum, i64 most) {
+    if (sum > most) {
+        Fail(line,
+             std::string(names) + ": " + std::to_string(sum) + " per mille, expected at most " + std::to_string(most));
+    }
+}
 
 void RequireNew(Line *line, bool exists, const std::string &what) {
     if (exists) {
@@ -37,6 +46,7 @@ void ApplyPcpu(Line *line) {
     i64 to = dots == std::string::npos ? from : CheckNumber(line, "pcpu", range.substr(dots + 2), from, last);
     i64 busy = TakePerMille(line, "busy");
     i64 worldlet = TakePerMille(line, "worldlet");
+    RequireShares(line, "worldlet=, a part of busy=", worldlet, busy);
     for (i64 pcpu = from; Complete(line) && pcpu <= to; pcpu++) {
         NodesSetPcpu(line->host, pcpu, busy, worldlet);
     }
@@ -73,6 +83,7 @@ void ApplyVm(Line *line) {
     spec.used = TakePerMille(line, "used");
     spec.ready = TakePerMille(line, "ready");
     spec.costop = TakePerMille(line, "costop");
+    RequireShares(line, "used=, ready= and costop= together", spec.used + spec.ready + spec.costop, 1000);
     RequireNew(line, line->host->vms.contains(spec.name), "VM " + Quoted(spec.name));
     RequireNew(line, line->host->instances.contains(HostKey(NODE_WORLD_CARTEL, spec.leader)),
                "leader " + std::to_string(spec.leader));
@@ -102,7 +113,7 @@ PortSpec TakePort(Line *line, i64 type) {
 
 void ApplyVnic(Line *line) {
     PortSpec spec = TakePort(line, PORT_VNIC);
-    spec.client = TakeText(line, "vm");
+    std::optional<Word> vmName = Take(line, "vm");
     std::string model = TakeText(line, "model");
     spec.scheme = TakeNumber(line, "scheme", 0, 0, MAX_ID);
     if (model == "parlan2" || model == "parlan3") {
@@ -112,11 +123,14 @@ void ApplyVnic(Line *line) {
     } else {
         Fail(line, "model= " + Quoted(model) + ": expected parlan2, parlan3 or a number");
     }
-    auto vm = line->host->vms.find(spec.client);
-    if (vm == line->host->vms.end()) {
-        return Fail(line, "vm " + Quoted(spec.client) + " unknown: expected the name of a vm line above");
+    if (vmName) {  // without one it is a port of nobody
+        spec.client = vmName->text;
+        auto vm = line->host->vms.find(spec.client);
+        if (vm == line->host->vms.end()) {
+            return Fail(line, "vm " + Quoted(spec.client) + " unknown: expected the name of a vm line above");
+        }
+        spec.leader = vm->second->value[LEADER];
     }
-    spec.leader = vm->second->value[LEADER];
     if (Complete(line)) {
         NodesAddPort(line->host, spec);
     }
@@ -171,6 +185,7 @@ void ApplyWorldlet(Line *line) {
     spec.used = TakePerMille(line, "used");
     spec.ready = TakePerMille(line, "ready");
     spec.wait = TakePerMille(line, "wait");
+    RequireShares(line, "used=, ready= and wait= together", spec.used + spec.ready + spec.wait, 1000);
     spec.pcpu = TakeNumber(line, "pcpu", 0, 0, MAX_ID);
     spec.vcpu = TakeNumber(line, "vcpu", 0, 0, MAX_ID);
     spec.worldlet = TakeNumber(line, "worldlet", MAX_ID, 0, MAX_ID);
@@ -236,27 +251,41 @@ Instance *TakeInstance(Line *line) {
     return &found->second;
 }
 
-u64 FieldValue(Line *line, const std::string &text) {
+// Whether a number, as it is written, can stand in that many bytes: signed or unsigned.
+bool Fits(const std::string &text, u64 value, i64 width) {
+    if (width == 8) {
+        return true;
+    }
+    return text[0] == '-' ? static_cast<i64>(value) >= -(i64{1} << (8 * width - 1)) : value >> (8 * width) == 0;
+}
+
+u64 FieldValue(Line *line, const std::string &text, i64 width) {
     std::optional<u64> value = ParseNumber(text);
-    if (!value) {
-        Fail(line, "value " + Quoted(text) + ": expected a number of 64 bits");
+    if (!value || !Fits(text, *value, width)) {
+        Fail(line, "value " + Quoted(text) + ": expected a number of " + std::to_string(8 * width) + " bits");
     }
     return value.value_or(0);
 }
 
+// From which second on; ascending from one then= to the next.
+i64 ThenFrom(Line *line, const std::string &text, i64 before) {
+    i64 from = CheckNumber(line, "then=", text, 0, 1000000000) * 1000000;
+    if (from < before) {
+        Fail(line, "then= " + Quoted(text) + ": expected ascending seconds");
+    }
+    return from;
+}
+
 // SEC:VALUE or SEC:VALUE:RATE
-Patch::Course ParseThen(Line *line, const std::string &text, const Patch::Course &before) {
+Patch::Course ParseThen(Line *line, const std::string &text, i64 width, const Patch::Course &before) {
     size_t first = text.find(':');
     size_t second = first == std::string::npos ? first : text.find(':', first + 1);
     if (first == std::string::npos) {
         Fail(line, "then= " + Quoted(text) + ": expected SECOND:VALUE or SECOND:VALUE:RATE");
         return before;
     }
-    i64 from = CheckNumber(line, "then=", text.substr(0, first), 0, 1000000000) * 1000000;
-    if (from < before.from) {
-        Fail(line, "then= " + Quoted(text) + ": expected ascending seconds");
-    }
-    u64 start = FieldValue(line, text.substr(first + 1, second - first - 1));
+    i64 from = ThenFrom(line, text.substr(0, first), before.from);
+    u64 start = FieldValue(line, text.substr(first + 1, second - first - 1), width);
     bool moves = second != std::string::npos;
     return {from, start, moves ? CheckNumber(line, "then=", text.substr(second + 1), MIN_I64, MAX_I64) : 0};
 }
@@ -270,10 +299,10 @@ void ApplyField(Line *line) {
     if (width != 1 && width != 2 && width != 4 && width != 8) {
         Fail(line, "width=" + std::to_string(width) + ": expected 1, 2, 4 or 8");
     }
-    u64 start = FieldValue(line, TakeText(line, "start"));
+    u64 start = FieldValue(line, TakeText(line, "start"), width);
     Patch patch = {0, 0, {{0, start, TakeNumber(line, "rate", 0, MIN_I64, MAX_I64)}}, {}};
     while (std::optional<Word> then = Take(line, "then")) {
-        patch.courses.push_back(ParseThen(line, then->text, patch.courses.back()));
+        patch.courses.push_back(ParseThen(line, then->text, width, patch.courses.back()));
     }
     AddPatch(line, instance, std::move(patch), width);
 }
@@ -295,24 +324,40 @@ void ApplyFill(Line *line) {
     }
 }
 
-void ApplyList(Line *line) {
-    u32 node = TakeNode(line);
-    Params keys = TakeKeys(line);
-    if (TakePlain(line, "= and the entries").text != "=") {
-        Fail(line, "no =: expected = and the entries");
-    }
+Params TakeEntries(Line *line) {
     Params entries;
     while (AtPlain(*line)) {
         entries.push_back(ToParam(line, TakePlain(line, "an entry"), "entry"));
     }
+    return entries;
+}
+
+// Behind each then= stand the entries from that second on.
+void ApplyList(Line *line) {
+    u32 node = TakeNode(line);
+    std::string key = HostKey(node, TakeKeys(line));
+    if (TakePlain(line, "= and the entries").text != "=") {
+        Fail(line, "no =: expected = and the entries");
+    }
+    Params entries = TakeEntries(line);
+    std::vector<ListCourse> courses;
+    while (std::optional<Word> then = Take(line, "then")) {
+        i64 from = ThenFrom(line, then->text, courses.empty() ? 0 : courses.back().from);
+        courses.push_back({from, TakeEntries(line)});
+    }
     if (Complete(line)) {
-        line->host->lists[HostKey(node, keys)] = std::move(entries);
+        line->host->lists[key] = std::move(entries);
+        line->host->courses.erase(key);
+        if (!courses.empty()) {
+            line->host->courses[key] = std::move(courses);
+        }
     }
 }
 
 void ApplyRemove(Line *line) {
     u32 node = TakeNode(line);
     std::string key = HostKey(node, TakeKeys(line));
+    line->host->courses.erase(key);
     if (Complete(line) && line->host->instances.erase(key) + line->host->lists.erase(key) == 0) {
         Fail(line, "no such instance or list: expected node and keys of a line above");
     }
@@ -339,17 +384,26 @@ const Keyword *FindKeyword(const std::string &name) {
     return nullptr;
 }
 
+void ApplyOne(Line *line, const LineReader &apply) {
+    apply(line);
+    const Host *host = line->host;
+    if (host != nullptr && host->instances.size() + host->lists.size() > MAX_ENTRIES) {
+        Fail(line, "too large a host: expected at most " + std::to_string(MAX_ENTRIES) + " records and lists");
+    }
+}
+
 void ApplyLine(Line *line, const LineReader &apply) {
     std::optional<Word> repeats = Take(line, "count");
     if (!repeats) {
-        return apply(line);
+        return ApplyOne(line, apply);
     }
-    i64 count = CheckNumber(line, "count=", repeats->text, 1, MAX_COUNT);
+    i64 count = CheckNumber(line, "count=", repeats->text, 1, *line->repeats);
+    *line->repeats -= count;
     for (i64 i = 0; i < count && line->problem.empty(); i++) {
-        Line one = {line->host, line->words, {}, line->known};
+        Line one = {line->host, line->words, {}, line->known, nullptr};
         Expand(&one, i);
         if (one.problem.empty()) {
-            apply(&one);
+            ApplyOne(&one, apply);
         }
         line->problem = std::move(one.problem);
     }
@@ -368,6 +422,9 @@ void LoadLine(Line *line, bool isFirst, const LineReader &fault) {
     if (line->host != nullptr && isFirst != (keyword->apply == ApplyHost)) {
         return Fail(line, "keyword " + Quoted(name) + ": expected one host line, ahead of all others");
     }
+    if (isFirst && line->host != nullptr) {
+        return ApplyHost(line);  // of which there is one: it knows no count=
+    }
     ApplyLine(line, keyword->apply != nullptr ? keyword->apply : fault);
 }
 
@@ -375,10 +432,11 @@ bool LoadText(const std::string &text, const char *file, Host *host, const LineR
     std::string_view rest = text;
     bool isFirst = true;
     int number = 0;
+    i64 repeats = MAX_REPEATS;
     std::string problem;
     for (std::string source; problem.empty() && TakePart(&rest, '\n', &source);) {
         number++;
-        Line line = {host, {}, {}, {}};
+        Line line = {host, {}, {}, {}, &repeats};
         SplitWords(&line, source);
         if (line.problem.empty() && !line.words.empty()) {
             LoadLine(&line, isFirst, fault);

@@ -49,12 +49,13 @@ void AppendKeys(std::string *key, const Params &keys) {
     }
 }
 
-// The key of a look-up, in a buffer that is used again each time.
+// The key of a look-up, in a buffer that is used again each time. Never destroyed: reads may still come while the
+// process ends.
 std::string_view LookUpKey(u32 node, const Params &keys) {
-    static thread_local std::string key;
-    StartKey(&key, node);
-    AppendKeys(&key, keys);
-    return key;
+    static auto *key = new std::string;
+    StartKey(key, node);
+    AppendKeys(key, keys);
+    return *key;
 }
 
 u32 SeedOf(std::string_view key) {
@@ -184,6 +185,13 @@ KnfStatus List(void *context, u32 node, const Params &keys, Params *entries) {
         return STATUS_NOT_FOUND;
     }
     *entries = found->second;
+    auto courses = host.courses.find(found->first);
+    if (courses != host.courses.end()) {
+        i64 elapsed = Now(host).elapsed;
+        for (const ListCourse &course : courses->second) {
+            *entries = course.from <= elapsed ? course.entries : *entries;
+        }
+    }
     return STATUS_OK;
 }
 

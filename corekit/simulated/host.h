@@ -90,6 +90,12 @@ struct Instance {
     std::unique_ptr<std::vector<Patch>> patches;
 };
 
+// What an instance list becomes.
+struct ListCourse {
+    i64 from;  // microseconds since the host was loaded
+    Params entries;
+};
+
 struct KeyHash {
     using is_transparent = void;
     size_t operator()(std::string_view key) const { return std::hash<std::string_view>()(key); }
@@ -102,7 +108,8 @@ struct Host {
     std::string signature = HOST_SIGNATURE;
     KeyMap<Instance> instances;
     KeyMap<Params> lists;
-    std::deque<Entity> entities;  // entities, trackers and texts never move, and live as long as the host
+    KeyMap<std::vector<ListCourse>> courses;  // of the lists that change, ascending
+    std::deque<Entity> entities;              // entities, trackers and texts never move, and live as long as the host
     std::deque<Tracker> trackers;
     std::unordered_set<std::string> texts;
     Tracker vcpuHistos{false};  // runs while the option "TrackHistos" is on

@@ -11,7 +11,7 @@ using Limits = std::vector<i64>;
 // rate, so that figures taken from the wrong field show.
 const std::vector<RecordKind> &FixedKinds() {
     // clang-format off
-    static const std::vector<RecordKind> kinds = {
+    static const auto &kinds = *new std::vector<RecordKind>{
         {NODE_PORT_TYPE,
          {{port_type::TYPE, LEVEL, TYPE}, {port_type::SUB_TYPE, LEVEL, SUB_TYPE}},
          {{port_type::SWITCH_NAME, SWITCH_NAME}}},
@@ -196,8 +196,9 @@ RecordKind VcpuHistogram(Slot slot) {
 }
 
 const std::unordered_map<u32, RecordKind> &Kinds() {
-    static const auto kinds = [] {
-        std::unordered_map<u32, RecordKind> all;
+    static const auto &kinds = *[] {
+        auto *made = new std::unordered_map<u32, RecordKind>;  // never destroyed: reads may come at the very end
+        std::unordered_map<u32, RecordKind> &all = *made;
         for (const RecordKind &kind : FixedKinds()) {
             all.emplace(kind.node, kind);
         }
@@ -213,7 +214,7 @@ const std::unordered_map<u32, RecordKind> &Kinds() {
             all.emplace(kind.node, kind);
         }
         all.emplace(NODE_VCPU_HISTO, VcpuHistogram(USED));
-        return all;
+        return made;
     }();
     return kinds;
 }
@@ -252,10 +253,11 @@ i64 MacOf(i64 kind, i64 port) {
 }
 
 void AddVcpu(Host *host, i64 id, const Entity *times) {
-    static const std::pair<const char *, RecordKind> histograms[] = {{"RUN", VcpuHistogram(USED)},
-                                                                     {"READY", VcpuHistogram(READY)},
-                                                                     {"COSTOP", VcpuHistogram(COSTOP)},
-                                                                     {"WAIT", VcpuHistogram(WAIT)}};
+    static const auto &histograms =
+        *new std::vector<std::pair<const char *, RecordKind>>{{"RUN", VcpuHistogram(USED)},
+                                                              {"READY", VcpuHistogram(READY)},
+                                                              {"COSTOP", VcpuHistogram(COSTOP)},
+                                                              {"WAIT", VcpuHistogram(WAIT)}};
     for (u32 node : {NODE_VCPU_TIMES, NODE_VCPU_EVENTS, NODE_VCPU_MIGRATIONS}) {
         HostAdd(host, HostKey(node, id), Kind(node), times);
     }

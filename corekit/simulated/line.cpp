@@ -14,13 +14,22 @@ bool IsBlank(char c) {
     return c == ' ' || c == '\t' || c == '\r';
 }
 
+bool IsHex(char c) {
+    return isxdigit(static_cast<unsigned char>(c)) != 0;
+}
+
 // Reads a quoted text with \" \\ and \xHH from the quote at `*at` on. False if it does not end.
-bool ReadQuoted(const std::string &text, size_t *at, std::string *result) {
+bool ReadQuoted(Line *line, const std::string &text, size_t *at, std::string *result) {
     for ((*at)++; *at < text.size() && text[*at] != '"'; (*at)++) {
         bool escaped = text[*at] == '\\' && *at + 1 < text.size();
         *at += escaped ? 1 : 0;
-        if (escaped && text[*at] == 'x' && *at + 2 < text.size()) {
-            *result += static_cast<char>(strtoul(text.substr(*at + 1, 2).c_str(), nullptr, 16));
+        if (escaped && text[*at] == 'x') {
+            std::string digits = text.substr(*at + 1, 2);
+            if (digits.size() != 2 || !IsHex(digits[0]) || !IsHex(digits[1])) {
+                Fail(line, "\\x" + digits + " in a text: expected two hexadecimal digits behind \\x");
+                return false;
+            }
+            *result += static_cast<char>(strtoul(digits.c_str(), nullptr, 16));
             *at += 2;
         } else {
             *result += text[*at];
@@ -29,7 +38,7 @@ bool ReadQuoted(const std::string &text, size_t *at, std::string *result) {
     return (*at)++ < text.size();
 }
 
-bool ReadWord(const std::string &text, size_t *at, Word *word) {
+bool ReadWord(Line *line, const std::string &text, size_t *at, Word *word) {
     size_t equals = text.find_first_of("= \t\r\"", *at);
     if (equals != std::string::npos && equals != *at && text[equals] == '=') {
         word->key = text.substr(*at, equals - *at);
@@ -37,7 +46,7 @@ bool ReadWord(const std::string &text, size_t *at, Word *word) {
     }
     if (*at < text.size() && text[*at] == '"') {
         word->quoted = true;
-        return ReadQuoted(text, at, &word->text) && (*at == text.size() || IsBlank(text[*at]));
+        return ReadQuoted(line, text, at, &word->text) && (*at == text.size() || IsBlank(text[*at]));
     }
     size_t end = std::min(text.find_first_of(" \t\r", *at), text.size());
     word->text = text.substr(*at, end - *at);
@@ -100,7 +109,7 @@ void SplitWords(Line *line, const std::string &text) {
             return;
         }
         Word word;
-        if (!ReadWord(text, &at, &word)) {
+        if (!ReadWord(line, text, &at, &word)) {
             Fail(line, "open text: expected a closing quote with a blank behind it");
             return;
         }

@@ -28,6 +28,7 @@ struct Line {
     std::vector<Word> words;  // what no step has taken yet
     std::string problem;      // "what: expected what"; empty while there is none
     std::string known;        // the keys that were asked for
+    i64 *repeats;             // how many lines count= may still stand for; null within such lines
 };
 
 void Fail(Line *line, const std::string &problem);
