@@ -111,8 +111,9 @@ std::string Steps(const std::string &record, const std::string &counters) {
     std::ostringstream out;
     for (unsigned long long at, size, from, by; words >> at >> size >> from >> by;) {
         from += by != 0 && size == 8 ? 1ULL << 53 : 0;
-        out << "field " << record << " at=" << at << " width=" << size << " start=" << from << " then=4:" << from + by
-            << "\n";
+        unsigned long long most = ~0ULL >> (64 - 8 * size);  // where a counter wraps
+        out << "field " << record << " at=" << at << " width=" << size << " start=" << from
+            << " then=4:" << ((from + by) & most) << "\n";
     }
     return out.str();
 }

@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <deque>
+#include <new>
 #include <unistd.h>
 #include <unordered_map>
 #include <utility>
@@ -120,8 +121,13 @@ void Misuse(const char *call, const uint32_t *node, const Params &keys, const st
     Fatal(call, KeysText(node, keys), what);
 }
 
-void CheckMade(const KnfParamListRec *list, const Params &keys) {
-    Known().alive.emplace(Address(list), list->node != 0 ? KeysText(&list->node, keys) : "");
+void CheckMade(KnfParamListRec *list, const Params &keys) {
+    try {
+        Known().alive.emplace(Address(list), list->node != 0 ? KeysText(&list->node, keys) : "");
+    } catch (const std::bad_alloc &) {
+        ParamListDestroy(list);
+        throw;
+    }
 }
 
 void CheckList(const char *call, const uint32_t *node, const KnfParamListRec *list) {
@@ -170,7 +176,12 @@ void CheckDestroy(KnfParamListRec *list) {
         return;
     }
     Lists &known = Known();
-    known.gone.push_back({Address(list), list->id, KeysOf(list), nullptr});
+    try {
+        known.gone.push_back({Address(list), list->id, KeysOf(list), nullptr});
+    } catch (const std::bad_alloc &) {
+        known.alive.erase(Address(list));
+        return ParamListDestroy(list);
+    }
     known.alive.erase(Address(list));
     for (KnfParamRec &param : list->params) {
         std::fill(param.text.begin(), param.text.end(), PATTERN);

@@ -13,8 +13,8 @@ void CheckSwitch(bool on);
 // "corekit: misuse: CALL [NODE] KEYS...: WHAT"
 [[noreturn]] void Misuse(const char *call, const uint32_t *node, const Params &keys, const std::string &what);
 
-// A new list, and for an instance list the keys that it was asked for with.
-void CheckMade(const KnfParamListRec *list, const Params &keys);
+// A new list, and for an instance list the keys that it was asked for with. Without memory for that the list goes.
+void CheckMade(KnfParamListRec *list, const Params &keys);
 // That the list is null or alive. `node` may be null.
 void CheckList(const char *call, const uint32_t *node, const KnfParamListRec *list);
 // That a handle which is about to be overwritten is no list's that is alive.
