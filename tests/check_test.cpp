@@ -13,6 +13,7 @@
 #include <string>
 #include <unistd.h>
 #include <utility>
+#include <vector>
 
 namespace {
 
@@ -225,4 +226,59 @@ TEST(Check, EnvironmentOfALesserUserIsNotHonoured) {
     EXPECT_EQ(run.status, 0);
     EXPECT_EQ(Count(run.out, "list 245 = \"vSwitch0\" "), 1U);
     EXPECT_EQ(Count(run.err, "list 245 = \"vSwitch0\" "), 0U) << "not the machine itself";
+}
+
+TEST(Check, SignatureSnapshotAndNamesFailOnDemand) {
+    WriteRunFile("faults", "fault cache nth=2\n");
+    const std::string host = std::string(HOST) + "uplink switch=s port=7 nic=w\n";
+    const std::string differs = ": md5 signature mismatch with running hostcore built on ";
+    MeterRun run = RunMeter(host + "fault signature nth=1\n", "-p 7");
+    EXPECT_EQ(run.status, 1);
+    EXPECT_TRUE(run.err.starts_with("0xbad000f" + differs + "Mar 14 2024")) << run.err;
+    EXPECT_TRUE(RunMeter(host, "-p 7 -t W -i 1").Port(7).contains("wdt"));
+    EXPECT_FALSE(RunMeter(host + "fault text\n", "-p 7 -t W -i 1").Port(7).contains("wdt"));
+    run = RunScript(host, "${METER% *} " RECORD_BINARY " -o s -i 1 -n 2 >out && $METER >out 2>err -p 7 -c s.0:s.1",
+                    {"COREKIT_FAULTS=faults"});
+    EXPECT_TRUE(run.err.starts_with(SIMULATED + "Couldn't open cache file s.1\n0xbad0002" + differs)) << run.err;
+    EXPECT_EQ(run.Document().at("stats").size(), 0U);
+}
+
+// Filters are listed anew for each record. Whatever else was found at the start is read to the end, and no more.
+TEST(Check, ListsThatShrinkVanishAndComeBackBetweenPasses) {
+    const std::pair<const char *, std::vector<std::string>> lists[] = {
+        {"list 123 \"n\" 0", {"10", "11", "12"}},
+        {"list 753 502", {"10500000", "10500001", "10500002"}},
+        {"list 1476", {"\"n-a\"", "\"n-b\"", "\"n-c\""}},
+        {"list 639", {"64", "65", "66"}},
+    };
+    std::string host =
+        "host name=h pcpus=1\nswitch s\nuplink switch=s port=9 nic=n filters=3\nvm v leader=500 vcpus=3\n"
+        "vnic switch=s port=7 vm=v model=3\nworldlet n-a\nworldlet n-b\nworldlet n-c\n"
+        "vector {64+i} names=n count=3\n";
+    for (const auto &[list, entry] : lists) {
+        host += std::string(list) + " = " + entry[0] + " " + entry[1] + " then=2 " + entry[0] + " then=4 then=6 " +
+                entry[1] + " " + entry[2] + " " + entry[0] + "\n";
+    }
+    MeterRun run = RunMeter(host, "-S s -t vqiW -i 2 -n 3");
+    EXPECT_EQ(run.err, "");
+    EXPECT_EQ(run.Port(9, 0)["rxqueue"]["details"].dump(), "[[10]]");
+    EXPECT_EQ(run.Port(9, 1)["rxqueue"]["details"].dump(), "[[]]");
+    EXPECT_EQ(run.Port(9, 2)["rxqueue"]["details"].dump(), "[[11,12,10]]");
+    for (const auto &[get, entries] : {std::pair{"\nget 770 ", lists[1].second},
+                                       {"\nget 1478 ", lists[2].second},
+                                       {"\nget 840 ", lists[3].second}}) {
+        EXPECT_EQ(Count(run.trace, get + entries[0] + " "), 4U) << get;
+        EXPECT_EQ(Count(run.trace, get + entries[1] + " "), 4U) << get;
+        EXPECT_EQ(Count(run.trace, get + entries[2] + " "), 0U) << get;
+    }
+}
+
+TEST(Check, PortOfNobodyHasNeitherVcpusNorWorldlets) {
+    MeterRun run =
+        RunMeter("host name=h pcpus=1\nswitch s\nvnic switch=s port=7 model=parlan3 tx=40 size=100\n", "-A -t vW -i 1");
+    EXPECT_EQ(run.Port(7)["txpps"], 40);
+    EXPECT_EQ(run.Port(7)["name"], "");
+    EXPECT_TRUE(run.Port(7).contains("vnic"));
+    EXPECT_FALSE(run.Port(7).contains("vcpu") || run.Port(7).contains("wdt"));
+    EXPECT_EQ(run.err, "");
 }

@@ -173,12 +173,29 @@ TEST(Corekit, ErrorsInDescriptionsNameLineAndExpectation) {
         {"field 603 at=8 width=4 start=1x\n", "text:2: value \"1x\": expected a number of 32 bits"},
         {"field 603 at=8 width=8 start=-9223372036854775809\n", "text:2: value \"-9223372036854775809\": expected a"},
         {"host name=again\n", "text:2: keyword \"host\": expected one host line"},
+        {"switch \"a\\x1\"\n", "text:2: \\x1\" in a text: expected two hexadecimal digits behind \\x"},
+        {"switch \"a\\x1g\"\n", "text:2: \\x1g in a text: expected two hexadecimal digits"},
+        {"field 603 at=8 width=2 start=65536\n", "text:2: value \"65536\": expected a number of 16 bits"},
+        {"field 603 at=8 width=2 start=65535 then=2:-32769\n", "text:2: value \"-32769\": expected a number of 16"},
+        {"fault get nth=2 from=3\n", "text:2: nth= and from=: expected one of them"},
+        {"fault get signal=15 status=3\n", "text:2: signal= and status=: expected one of them"},
+        {"fault get signal=15 delay=3\n", "text:2: signal= and delay=: expected one of them"},
+        {"fault cache 603\n", "text:2: node too many: expected one for get, list, set and any alone"},
+        {"pcpu 0 busy=5 worldlet=6\n", "text:2: worldlet=, a part of busy=: 6 per mille, expected at most 5"},
+        {"vm v leader=7 used=900 ready=90 costop=11\n", "text:2: used=, ready= and costop= together: 1001 per mille"},
+        {"worldlet w used=900 ready=90 wait=11\n", "text:2: used=, ready= and wait= together: 1001 per mille"},
+        {"self count=9\nself count=999992\n", "text:3: count= \"999992\": expected a number from 1 to 999991"},
+        {"record 9 {i} size=1 count=999999\n", "text:2: too large a host: expected at most 1000000 records and"},
+        {"list 9 = 1 then=3 1 then=2\n", "text:2: then= \"2\": expected ascending seconds"},
     };
     for (const auto &[text, expected] : cases) {
         std::string error;
         EXPECT_FALSE(CorekitLoad(std::string("host name=h\n") + text, &error));
         EXPECT_EQ(error.substr(0, strlen(expected)), expected);
     }
+    std::string error;
+    EXPECT_FALSE(CorekitLoad("host count=2\n", &error));
+    EXPECT_EQ(error.substr(0, 20), "text:1: key count= u");
     CorekitRecord(true);
     setenv("COREKIT_HOST", "/nowhere", 1);
     EXPECT_EQ(HckSyscall_Init(1, 0, 0), -1);
