@@ -5,9 +5,11 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <cstdlib>
+#include <cstring>
 #include <deque>
+#include <functional>
 #include <new>
-#include <unistd.h>
 #include <unordered_map>
 #include <utility>
 
@@ -41,12 +43,17 @@ struct Lists {
 
 // Never destroyed: calls may still come while the process ends.
 Lists &Known() {
-    static auto *lists = new Lists;
+    alignas(Lists) static char place[sizeof(Lists)];
+    static auto *lists = new (place) Lists;
     return *lists;
 }
 
 uintptr_t Address(const KnfParamListRec *list) {
     return ~reinterpret_cast<uintptr_t>(list);
+}
+
+const KnfParamListRec *ListAt(uintptr_t address) {
+    return reinterpret_cast<const KnfParamListRec *>(~address);  // NOLINT(performance-no-int-to-ptr): hidden on purpose
 }
 
 std::string KeysText(const uint32_t *node, const Params &keys) {
@@ -65,7 +72,7 @@ std::string KeysOf(const KnfParamListRec *list) {
 
 [[noreturn]] void Fatal(const char *call, const std::string &keys, const std::string &what) {
     std::string line = std::string("corekit: misuse: ") + call + keys + ": " + what + "\n";
-    (void)!write(STDERR_FILENO, line.data(), line.size());
+    fputs(line.c_str(), stderr);
     abort();
 }
 
@@ -83,7 +90,7 @@ const GoneList *FindGone(const KnfParamListRec *list) {
 // The list that holds an entry; null for an entry of none that is alive.
 const KnfParamListRec *Holder(const KnfParamRec *param) {
     for (const auto &[address, keys] : Known().alive) {
-        const auto *list = reinterpret_cast<const KnfParamListRec *>(~address);
+        const KnfParamListRec *list = ListAt(address);
         if (!std::less<>()(param, list->params.data()) &&
             std::less<>()(param, list->params.data() + list->params.size())) {
             return list;
@@ -101,7 +108,7 @@ struct AtExit {
         }
         const KnfParamListRec *latest = nullptr;
         for (const auto &[address, keys] : Known().alive) {
-            const auto *list = reinterpret_cast<const KnfParamListRec *>(~address);
+            const KnfParamListRec *list = ListAt(address);
             latest = latest == nullptr || list->id > latest->id ? list : latest;
         }
         Fatal("exit", latest != nullptr ? KeysOf(latest) : "",
@@ -130,7 +137,7 @@ void CheckMade(KnfParamListRec *list, const Params &keys) {
     }
 }
 
-void CheckList(const char *call, const uint32_t *node, const KnfParamListRec *list) {
+void CheckList(const char *call, const uint32_t *node, const KnfParamListRec *list) noexcept {
     if (list == nullptr || Known().alive.contains(Address(list))) {
         return;
     }
@@ -146,7 +153,7 @@ void CheckOverwritten(uint32_t node, const Params &keys, const KnfParamListRec *
     }
 }
 
-void CheckIndex(const char *call, const KnfParamListRec *list, uint32_t index) {
+void CheckIndex(const char *call, const KnfParamListRec *list, uint32_t index) noexcept {
     CheckList(call, nullptr, list);
     size_t size = ParamListParams(list).size();
     if (index >= size) {
@@ -156,7 +163,7 @@ void CheckIndex(const char *call, const KnfParamListRec *list, uint32_t index) {
     }
 }
 
-void CheckType(const char *call, const KnfParamRec *param, bool asText) {
+void CheckType(const char *call, const KnfParamRec *param, bool asText) noexcept {
     if (param == nullptr || param->isText == asText) {
         return;
     }
@@ -185,7 +192,7 @@ void CheckDestroy(KnfParamListRec *list) {
     known.alive.erase(Address(list));
     for (KnfParamRec &param : list->params) {
         std::fill(param.text.begin(), param.text.end(), PATTERN);
-        param.number = PATTERN;
+        memset(&param.number, PATTERN, sizeof param.number);
     }
     if (FREE_AT_ONCE) {
         ParamListDestroy(list);

@@ -1,8 +1,6 @@
 // The C entry points of parameter lists.
 #include "corekit/entry/library.h"
 
-#include <utility>
-
 namespace {
 
 uint32_t NumberOf(const KnfParamListRec *list) {
@@ -30,9 +28,10 @@ KnfStatus AddParam(const char *call, KnfParamList list, KnfParamRec param) {
         status = STATUS_NOT_WRITABLE;
     }
     if (status == STATUS_OK) {
-        status = ParamListAdd(list, std::move(param));
+        status = ParamListAdd(list, &param);
     }
-    return ToldOf(status, "add", list, status == STATUS_OK ? &list->params.back() : &param);
+    const Params &held = ParamListParams(list);
+    return ToldOf(status, "add", list, status == STATUS_OK && !held.empty() ? &held.back() : &param);
 }
 
 KnfStatus EntryText(KnfParamList list, uint32_t index, const char **text) {

@@ -45,14 +45,14 @@ uint64_t ParamListsAlive() {
     return alive;
 }
 
-KnfStatus ParamListAdd(KnfParamListRec *list, KnfParamRec &&param) {
+KnfStatus ParamListAdd(KnfParamListRec *list, KnfParamRec *param) {
     if (list == nullptr) {
         return KNF_FAILURE;
     }
     if (list->params.size() >= list->capacity) {
         return STATUS_LIST_FULL;
     }
-    list->params.push_back(std::move(param));
+    list->params.push_back(std::move(*param));
     return STATUS_OK;
 }
 

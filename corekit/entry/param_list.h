@@ -18,8 +18,7 @@ KnfParamListRec *ParamListFrom(uint32_t node, Params params);  // an instance li
 void ParamListDestroy(KnfParamListRec *list);
 void ParamListRetire(KnfParamListRec *list);  // is alive no more, but not freed yet
 uint64_t ParamListsAlive();
-// Takes the parameter only on 0.
-KnfStatus ParamListAdd(KnfParamListRec *list, KnfParamRec &&param);
+KnfStatus ParamListAdd(KnfParamListRec *list, KnfParamRec *param);  // takes its value, but only on 0
 void ParamListRemoveLast(KnfParamListRec *list);
 inline KnfParamRec *ParamListAt(KnfParamListRec *list, uint32_t index) {
     return list != nullptr && index < list->params.size() ? &list->params[index] : nullptr;
