@@ -68,7 +68,9 @@ KnfParamList KNF_ParamListCreate(uint32_t kind, uint32_t capacity) {
             CheckMade(list, {});
         }
         if (JournalWanted(false)) {
-            Told(status, "create", nullptr, {ParamOf(kind), ParamOf(capacity)}, nullptr, NumberOf(list));
+            Contained(status, [&] {
+                return Told(status, "create", nullptr, {ParamOf(kind), ParamOf(capacity)}, nullptr, NumberOf(list));
+            });
         }
         return list;
     });

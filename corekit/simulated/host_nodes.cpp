@@ -1,6 +1,7 @@
 #include "corekit/simulated/host_nodes.h"
 
 #include <unistd.h>
+#include <utility>
 
 namespace {
 
@@ -197,8 +198,7 @@ RecordKind VcpuHistogram(Slot slot) {
 
 const std::unordered_map<u32, RecordKind> &Kinds() {
     static const auto &kinds = *[] {
-        auto *made = new std::unordered_map<u32, RecordKind>;  // never destroyed: reads may come at the very end
-        std::unordered_map<u32, RecordKind> &all = *made;
+        std::unordered_map<u32, RecordKind> all;
         for (const RecordKind &kind : FixedKinds()) {
             all.emplace(kind.node, kind);
         }
@@ -214,7 +214,7 @@ const std::unordered_map<u32, RecordKind> &Kinds() {
             all.emplace(kind.node, kind);
         }
         all.emplace(NODE_VCPU_HISTO, VcpuHistogram(USED));
-        return made;
+        return new auto(std::move(all));  // never destroyed: reads may come at the very end
     }();
     return kinds;
 }
