@@ -253,3 +253,11 @@ TEST(Corekit, RecordsOfTheBuiltInAndOfABareHostAreTheKnownOnes) {
     EXPECT_EQ(RunFile("sum"), "3620711415 105727\n");
     EXPECT_LT(std::stoi(RunFile("size")), 30000) << "packed to a sixth";
 }
+
+// What the program makes of counters, apart from how a simulated host moves by itself: each figure of these reports
+// comes from a field line.
+TEST(Corekit, ReportOfCountersSetByHandIsTheKnownOne) {
+    RunScript("", "for more in '' -a; do ${METER% *} COREKIT_HOST=" TEST_DATA "/explicit.host build/lan-meter -A -t "
+                  "vqiWcCQhV -i 3 -n 3 $more | cksum; done >sum");
+    EXPECT_EQ(RunFile("sum"), "2159643162 85669\n3024732459 85950\n");
+}
