@@ -24,6 +24,7 @@ install(TARGETS knf-record knf-source RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR
 install(FILES docs/man/knf-record.1 docs/man/knf-source.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 COMPONENT corekit)
 install(FILES docs/linux.md docs/host-description.md docs/snapshot-format.md
   DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/lan-meter-corekit COMPONENT corekit)
+install(DIRECTORY docs/examples DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/lan-meter-corekit COMPONENT corekit)
 
 set(CPACK_GENERATOR DEB)
 set(CPACK_PACKAGE_VENDOR "lan-meter maintainers")

@@ -4,7 +4,9 @@
 
 namespace {
 
-const std::string HEAD = "host name=h1 pcpus=1 packages=1 cores=1 llc=7\nswitch sw0\n";
+// Filters serve the other ports, from 10 on.
+const std::string HEAD = "host name=h1 pcpus=1 packages=1 cores=1 llc=7\nswitch sw0\n"
+                         "plain switch=sw0 type=2 port={10+i} count=4\n";
 const std::string HOST =
     HEAD + "uplink switch=sw0 port=9 nic=nic0 device=dev.0 txqueues=3 rxqueues=4 filters=2,0,0,1\n";
 

@@ -2,11 +2,13 @@
 
 #include "corekit/simulated/host_nodes.h"
 
+#include <algorithm>
 #include <utility>
 
 namespace {
 
 constexpr i64 MAX_RECORD = 1 << 20;
+constexpr i64 DEFAULT_UPTIME = 7384;  // seconds; two hours, three minutes and four seconds
 constexpr i64 MAX_REPEATS = 1000000;     // lines that all count= of a description stand for
 constexpr size_t MAX_ENTRIES = 1000000;  // records and instance lists of a host
 
@@ -24,6 +26,32 @@ void RequireNew(Line *line, bool exists, const std::string &what) {
     }
 }
 
+// A number that follows from the whole host where the line leaves it out.
+std::optional<i64> TakeStated(Line *line, const char *key, i64 low, i64 high) {
+    bool stated = std::any_of(line->words.begin(), line->words.end(), [key](const Word &w) { return w.key == key; });
+    i64 number = TakeNumber(line, key, low, low, high);
+    return stated ? std::optional<i64>(number) : std::nullopt;
+}
+
+// constant, wave, burst or burst:SEED; null is constant.
+LoadCurve *TakeLoad(Line *line, LoadCurve *fallback) {
+    std::optional<Word> word = Take(line, "load");
+    if (!word) {
+        return fallback;
+    }
+    std::string kind = word->text.substr(0, word->text.find(':'));
+    i64 seed = kind == "burst" && kind != word->text
+                   ? CheckNumber(line, "load=burst:", word->text.substr(kind.size() + 1), 0, MAX_LOAD_SEED)
+                   : 0;
+    if (kind == "burst") {
+        return HostLoad(line->host, LoadKind::BURST, static_cast<u64>(seed));
+    }
+    if (word->text != "constant" && word->text != "wave") {
+        Fail(line, "load= " + Quoted(word->text) + ": expected constant, wave, burst or burst:SEED");
+    }
+    return HostLoad(line->host, kind == "wave" ? LoadKind::WAVE : LoadKind::CONSTANT, 0);
+}
+
 void ApplyHost(Line *line) {
     HostSpec spec;
     spec.name = TakeText(line, "name", "host");
@@ -31,6 +59,8 @@ void ApplyHost(Line *line) {
     spec.packages = TakeNumber(line, "packages", 2, 0, 65536);
     spec.cores = TakeNumber(line, "cores", 4, 0, 65536);
     spec.llc = TakeNumber(line, "llc", 2, 0, MAX_ID);
+    spec.uptime = TakeNumber(line, "uptime", DEFAULT_UPTIME, 0, 1000000000);
+    spec.load = TakeLoad(line, nullptr);
     std::string signature = TakeText(line, "signature", HOST_SIGNATURE);
     if (Complete(line)) {
         line->host->signature = signature;
@@ -44,9 +74,11 @@ void ApplyPcpu(Line *line) {
     i64 last = static_cast<i64>(line->host->pcpus.size()) - 1;
     i64 from = CheckNumber(line, "pcpu", range.substr(0, dots), 0, last);
     i64 to = dots == std::string::npos ? from : CheckNumber(line, "pcpu", range.substr(dots + 2), from, last);
-    i64 busy = TakePerMille(line, "busy");
-    i64 worldlet = TakePerMille(line, "worldlet");
-    RequireShares(line, "worldlet=, a part of busy=", worldlet, busy);
+    std::optional<i64> busy = TakeStated(line, "busy", 0, 1000);
+    std::optional<i64> worldlet = TakeStated(line, "worldlet", 0, 1000);
+    if (busy && worldlet) {
+        RequireShares(line, "worldlet=, a part of busy=", *worldlet, *busy);
+    }
     for (i64 pcpu = from; Complete(line) && pcpu <= to; pcpu++) {
         NodesSetPcpu(line->host, pcpu, busy, worldlet);
     }
@@ -55,15 +87,16 @@ void ApplyPcpu(Line *line) {
 void ApplySelf(Line *line) {
     i64 used = TakePerMille(line, "used");
     if (Complete(line)) {
-        line->host->self->value[USED] = used;
+        NodesSetSelf(line->host, used);
     }
 }
 
 void ApplyStack(Line *line) {
-    i64 tx = TakeRate(line, "tx");
-    i64 rx = TakeRate(line, "rx");
+    std::optional<i64> tx = TakeStated(line, "tx", -MAX_RATE, MAX_RATE);
+    std::optional<i64> rx = TakeStated(line, "rx", -MAX_RATE, MAX_RATE);
+    LoadCurve *load = TakeLoad(line, line->host->load);
     if (Complete(line)) {
-        NodesSetStack(line->host, tx, rx);
+        NodesSetStack(line->host, tx, rx, load);
     }
 }
 
@@ -84,6 +117,8 @@ void ApplyVm(Line *line) {
     spec.ready = TakePerMille(line, "ready");
     spec.costop = TakePerMille(line, "costop");
     RequireShares(line, "used=, ready= and costop= together", spec.used + spec.ready + spec.costop, 1000);
+    spec.pcpu = TakeStated(line, "pcpu", 0, MAX_ID).value_or(UNSTATED);
+    spec.load = TakeLoad(line, line->host->load);
     RequireNew(line, line->host->vms.contains(spec.name), "VM " + Quoted(spec.name));
     RequireNew(line, line->host->instances.contains(HostKey(NODE_WORLD_CARTEL, spec.leader)),
                "leader " + std::to_string(spec.leader));
@@ -98,10 +133,12 @@ PortSpec TakePort(Line *line, i64 type) {
     spec.type = type;
     spec.switchName = TakeText(line, "switch");
     spec.port = TakeNumber(line, "port", std::nullopt, 1, MAX_ID);
-    spec.tx = TakeRate(line, "tx");
-    spec.rx = TakeRate(line, "rx");
-    spec.size = TakeNumber(line, "size", 512, 0, 1000000);
-    spec.errors = TakeRate(line, "errors");
+    spec.tx = TakeStated(line, "tx", -MAX_RATE, MAX_RATE);
+    spec.rx = TakeStated(line, "rx", -MAX_RATE, MAX_RATE);
+    spec.size = TakeStated(line, "size", 0, 1000000);
+    spec.txErrors = TakeRate(line, "errors");
+    spec.rxErrors = TakeStated(line, "rxerrors", -MAX_RATE, MAX_RATE).value_or(2 * spec.txErrors);
+    spec.load = line->host->load;
     spec.flags = 1;
     if (!line->host->lists.contains(HostKey(NODE_SWITCH_PORTS, spec.switchName))) {
         Fail(line, "switch " + Quoted(spec.switchName) + " unknown: expected the name of a switch line above");
@@ -109,6 +146,12 @@ PortSpec TakePort(Line *line, i64 type) {
     RequireNew(line, line->host->instances.contains(HostKey(NODE_PORT_TYPE, spec.port)),
                "port " + std::to_string(spec.port));
     return spec;
+}
+
+// Takes the load, which a virtual NIC has from its VM otherwise. Null when the line has a problem.
+Entity *AddPort(Line *line, PortSpec spec) {
+    spec.load = TakeLoad(line, spec.load);
+    return Complete(line) ? NodesAddPort(line->host, spec) : nullptr;
 }
 
 void ApplyVnic(Line *line) {
@@ -130,10 +173,9 @@ void ApplyVnic(Line *line) {
             return Fail(line, "vm " + Quoted(spec.client) + " unknown: expected the name of a vm line above");
         }
         spec.leader = vm->second->value[LEADER];
+        spec.load = vm->second->load;
     }
-    if (Complete(line)) {
-        NodesAddPort(line->host, spec);
-    }
+    AddPort(line, spec);
 }
 
 void ApplyUplink(Line *line) {
@@ -143,6 +185,7 @@ void ApplyUplink(Line *line) {
     nic.name = port.client = TakeText(line, "nic");
     nic.device = TakeText(line, "device", "");
     nic.txQueues = TakeNumber(line, "txqueues", 1, 0, 1024);
+    nic.first = TakeStated(line, "first", 0, 1000);
     i64 rxQueues = TakeNumber(line, "rxqueues", 1, 0, 1024);
     for (const std::string &count : SplitCommas(TakeText(line, "filters", ""))) {
         nic.filters.push_back(CheckNumber(line, "filters=", count, 0, 1024));
@@ -152,31 +195,48 @@ void ApplyUplink(Line *line) {
     }
     nic.filters.resize(static_cast<size_t>(rxQueues));
     RequireNew(line, line->host->instances.contains(HostKey(NODE_NIC_PROPERTIES, nic.name)), "nic " + Quoted(nic.name));
-    if (Complete(line)) {
-        nic.port = port.port;
-        nic.tx = port.tx;
-        nic.rx = port.rx;
-        nic.size = port.size;
-        nic.errors = port.errors;
-        NodesAddPort(line->host, port);
-        NodesAddNic(line->host, nic);
+    if (Entity *entity = AddPort(line, port)) {
+        NodesAddNic(line->host, nic, entity);
     }
 }
 
 void ApplyHostNic(Line *line) {
     PortSpec spec = TakePort(line, PORT_HOST_STACK);
     spec.client = TakeText(line, "name");
-    if (Complete(line)) {
-        NodesAddPort(line->host, spec);
-    }
+    AddPort(line, spec);
 }
 
 void ApplyPlain(Line *line) {
     PortSpec spec = TakePort(line, TakeNumber(line, "type", std::nullopt, 0, MAX_ID));
     spec.client = TakeText(line, "client", "");
-    if (Complete(line)) {
-        NodesAddPort(line->host, spec);
+    AddPort(line, spec);
+}
+
+// A vcpu's id, or VM/N for a VM's vcpu N; 0 when it is left out.
+i64 TakeVcpu(Line *line) {
+    std::optional<Word> word = Take(line, "vcpu");
+    size_t slash = word ? word->text.rfind('/') : std::string::npos;
+    if (slash == std::string::npos) {
+        return word ? CheckNumber(line, "vcpu=", word->text, 0, MAX_ID) : 0;
     }
+    auto vm = line->host->vms.find(word->text.substr(0, slash));
+    if (vm == line->host->vms.end()) {
+        Fail(line, "vcpu= " + Quoted(word->text) + ": expected a number, or VM/N with the name of a vm line above");
+        return 0;
+    }
+    i64 last = vm->second->value[VCPUS] - 1;
+    return NodesVcpuId(vm->second->value[LEADER], CheckNumber(line, "vcpu=", word->text.substr(slash + 1), 0, last));
+}
+
+// A worldlet's number, which is its place among the worldlet lines from 0 on, or its name.
+i64 TakeWorldlet(Line *line) {
+    std::optional<Word> word = Take(line, "worldlet");
+    if (!word) {
+        return MAX_ID;
+    }
+    auto named = line->host->instances.find(HostKey(NODE_WORLDLET_STATS, word->text));
+    bool known = named != line->host->instances.end() && named->second.entity != nullptr;
+    return known ? named->second.entity->value[WORLDLET_ID] : CheckNumber(line, "worldlet=", word->text, 0, MAX_ID);
 }
 
 void ApplyWorldlet(Line *line) {
@@ -184,11 +244,12 @@ void ApplyWorldlet(Line *line) {
     spec.name = TakePlain(line, "a worldlet name").text;
     spec.used = TakePerMille(line, "used");
     spec.ready = TakePerMille(line, "ready");
-    spec.wait = TakePerMille(line, "wait");
-    RequireShares(line, "used=, ready= and wait= together", spec.used + spec.ready + spec.wait, 1000);
-    spec.pcpu = TakeNumber(line, "pcpu", 0, 0, MAX_ID);
-    spec.vcpu = TakeNumber(line, "vcpu", 0, 0, MAX_ID);
-    spec.worldlet = TakeNumber(line, "worldlet", MAX_ID, 0, MAX_ID);
+    spec.wait = TakeStated(line, "wait", 0, 1000);
+    RequireShares(line, "used=, ready= and wait= together", spec.used + spec.ready + spec.wait.value_or(0), 1000);
+    spec.pcpu = TakeStated(line, "pcpu", 0, MAX_ID);
+    spec.vcpu = TakeVcpu(line);
+    spec.worldlet = TakeWorldlet(line);
+    spec.load = TakeLoad(line, line->host->load);
     RequireNew(line, line->host->instances.contains(HostKey(NODE_WORLDLET_STATS, spec.name)),
                "worldlet " + Quoted(spec.name));
     if (Complete(line)) {
@@ -197,17 +258,18 @@ void ApplyWorldlet(Line *line) {
 }
 
 void ApplyVector(Line *line) {
-    i64 vector = CheckNumber(line, "vector", TakePlain(line, "a vector number").text, 0, MAX_I64);
-    Params names;
+    VectorSpec spec;
+    spec.vector = CheckNumber(line, "vector", TakePlain(line, "a vector number").text, 0, MAX_I64);
     for (const std::string &name : SplitCommas(TakeText(line, "names", ""))) {
-        names.push_back(ParamOf(name));
+        spec.names.push_back(ParamOf(name));
     }
-    i64 rate = TakeRate(line, "rate");
-    i64 time = TakeRate(line, "time");
-    RequireNew(line, line->host->lists.contains(HostKey(NODE_VECTOR_NAMES, vector)),
-               "vector " + std::to_string(vector));
+    spec.rate = TakeRate(line, "rate");
+    spec.time = TakeRate(line, "time");
+    spec.load = TakeLoad(line, line->host->load);
+    RequireNew(line, line->host->lists.contains(HostKey(NODE_VECTOR_NAMES, spec.vector)),
+               "vector " + std::to_string(spec.vector));
     if (Complete(line)) {
-        NodesAddVector(line->host, vector, names, rate, time);
+        NodesAddVector(line->host, spec);
     }
 }
 
@@ -458,7 +520,11 @@ bool LoadText(const std::string &text, const char *file, Host *host, const LineR
 bool DescriptionLoad(const std::string &text, const char *file, Host *host, const LineReader &fault,
                      std::string *error) {
     host->loadedAt = HostClock();
-    return LoadText(text, file, host, fault, error);
+    if (!LoadText(text, file, host, fault, error)) {
+        return false;
+    }
+    NodesSettle(host);
+    return true;
 }
 
 bool DescriptionFaults(const std::string &text, const char *file, const LineReader &fault, std::string *error) {

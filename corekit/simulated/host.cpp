@@ -11,18 +11,11 @@ namespace {
 constexpr i64 SECOND = 1000000;
 constexpr size_t NOISE_SPAN = 4096;
 
-u64 Mix(u64 value) {
-    value += 0x9e3779b97f4a7c15;
-    value = (value ^ value >> 30) * 0xbf58476d1ce4e5b9;
-    value = (value ^ value >> 27) * 0x94d049bb133111eb;
-    return value ^ value >> 31;
-}
-
 const std::array<char, 2 * NOISE_SPAN> &Noise() {
     static const auto noise = [] {
         std::array<char, 2 * NOISE_SPAN> bytes;
         for (size_t i = 0; i < bytes.size(); i++) {
-            bytes[i] = static_cast<char>(Mix(i) % 255 + 1);
+            bytes[i] = static_cast<char>(Hashed(i) % 255 + 1);
         }
         return bytes;
     }();
@@ -60,60 +53,114 @@ std::string_view LookUpKey(u32 node, const Params &keys) {
 
 u32 SeedOf(std::string_view key) {
     u64 seed = key.size();
-    for (char c : key) {
-        seed = Mix(seed ^ static_cast<unsigned char>(c));
+    for (u64 word = 0; !key.empty(); key.remove_prefix(std::min(key.size(), sizeof word)), word = 0) {
+        memcpy(&word, key.data(), std::min(key.size(), sizeof word));
+        seed = Hashed(seed ^ word);
     }
     return static_cast<u32>(seed);
 }
 
 // rate x elapsed, exact, cut towards zero.
-u64 Moved(i64 rate, i64 factor, i64 divisor, i64 elapsed) {
-    return static_cast<u64>(static_cast<__int128>(rate) * factor * elapsed / (static_cast<__int128>(divisor) * SECOND));
+u64 Moved(i64 rate, i64 elapsed) {
+    return static_cast<u64>(static_cast<__int128>(rate) * elapsed / SECOND);
 }
 
 void Store(char *record, u32 offset, u32 width, u64 value) {
     memcpy(record + offset, &value, width);
 }
 
-i64 Collected(const Tracker &tracker, i64 elapsed) {
-    return tracker.collected + (tracker.running ? elapsed - tracker.since : 0);
-}
-
 struct Moment {
     i64 clock;    // of the host's time of day
     i64 elapsed;  // since the host was loaded
+    i64 started;  // the clock when the host was started
+    Work life;    // since then
 };
 
 Moment Now(const Host &host) {
     i64 clock = HostClock();
-    return {clock, clock - host.loadedAt};
+    i64 started = host.loadedAt - host.age;
+    return {clock, clock - host.loadedAt, started, WorkOf(clock - started)};
+}
+
+i64 Micros(const Work &work) {
+    return work.seconds * SECOND + work.micros;
+}
+
+// rate x work of all parts of the entity, whole, from a fraction of a count on.
+u64 Count(const Entity &entity, Slot slot, const Moment &now) {
+    u64 count = 0;
+    u32 phase = (entity.phase + slot) * 2654435761U;
+    i64 rest = static_cast<i64>(u64{phase} * SECOND >> 32);
+    for (const Entity *part = &entity; part != nullptr; part = part->more) {
+        i64 rate = part->value[slot];
+        const Work &work = part->load == nullptr ? now.life : LoadWork(part->load, now.started, now.clock);
+        i64 micros = rate * work.micros + rest;
+        count += static_cast<u64>(rate) * static_cast<u64>(work.seconds) + static_cast<u64>(micros / SECOND);
+        rest = micros % SECOND;
+    }
+    return rest < 0 ? count - 1 : count;
+}
+
+i64 Collected(const Tracker &tracker, i64 now) {
+    u64 since = tracker.running ? static_cast<u64>(now) - static_cast<u64>(tracker.since) : 0;
+    return static_cast<i64>(static_cast<u64>(tracker.collected) + since);
+}
+
+u64 Counted(const Instance &instance, Slot slot, const Moment &now) {
+    const Tracker *tracker = instance.tracker;
+    if (tracker == nullptr) {
+        return Count(*instance.entity, slot, now);
+    }
+    if (tracker->ofPort) {
+        u64 count = tracker->running ? Count(*instance.entity, slot, now) : 0;
+        return static_cast<u64>(Collected(*tracker, static_cast<i64>(count)));
+    }
+    // Of vcpus, periods at full load.
+    Work work = WorkOf(Collected(*tracker, Micros(now.life)));
+    i64 rate = instance.entity->value[slot];
+    return static_cast<u64>(rate * work.seconds + rate * work.micros / SECOND) / instance.kind->grain;
+}
+
+u64 Share(u64 count, i64 factor, i64 divisor, i64 from) {
+    if (divisor == 1) {
+        return count * static_cast<u64>(factor);
+    }
+    auto of = static_cast<u64>(divisor);
+    auto begun = static_cast<i64>(count % of) - from;
+    return count / of * static_cast<u64>(factor) + static_cast<u64>(std::clamp<i64>(begun, 0, factor));
 }
 
 void FillFields(const Instance &instance, const Moment &now, char *record) {
     const Entity &entity = *instance.entity;
-    const Tracker *tracker = instance.tracker;
-    i64 elapsed = tracker != nullptr ? Collected(*tracker, now.elapsed) : now.elapsed;
+    Slot counted = SLOTS;
+    u64 count = 0;
     u64 total = 0;
-    u64 index = 0;
     for (const Field &field : instance.kind->fields) {
         i64 slot = entity.value[field.slot];
         u64 value = 0;
+        if (field.motion <= QUEUED && field.slot != counted) {
+            counted = field.slot;
+            count = Counted(instance, counted, now);
+        }
         switch (field.motion) {
         case COUNT:
-            value = Moved(slot, field.factor, field.divisor, elapsed);
-            if (tracker == nullptr || !tracker->fromZero) {
-                value += Mix(instance.seed + (index << 32)) % 1000000007 + 1;
-            }
+            value = Share(count, field.factor, field.divisor, field.from) * static_cast<u64>(entity.value[field.times]);
             total += value;
             break;
+        case QUEUED:
+            value = Share(count, entity.value[SHARE], entity.value[SHARE_OF], entity.value[SHARE_FROM]);
+            break;
         case SOME:
-            value = elapsed > 0 ? static_cast<u64>(slot * field.factor / field.divisor) : 0;
+            value = count > 0 ? static_cast<u64>(slot * field.factor / field.divisor) : 0;
             break;
         case LEVEL:
             value = static_cast<u64>(slot * field.factor / field.divisor);
             break;
         case TOTAL:
             value = total;
+            break;
+        case LIFETIME:
+            value = static_cast<u64>(Micros(now.life));
             break;
         case SECONDS:
             value = static_cast<u64>(now.clock / SECOND);
@@ -123,7 +170,6 @@ void FillFields(const Instance &instance, const Moment &now, char *record) {
             break;
         }
         Store(record, field.at.offset, field.at.width, value);
-        index++;
     }
 }
 
@@ -147,7 +193,7 @@ void ApplyPatch(const Patch &patch, i64 elapsed, char *record) {
     for (const Patch::Course &next : patch.courses) {
         course = next.from <= elapsed ? &next : course;
     }
-    Store(record, patch.offset, patch.width, course->start + Moved(course->rate, 1, 1, elapsed - course->from));
+    Store(record, patch.offset, patch.width, course->start + Moved(course->rate, elapsed - course->from));
 }
 
 KnfStatus Get(void *context, u32 node, const Params &keys, void *buffer, u32 size) {
@@ -162,7 +208,7 @@ KnfStatus Get(void *context, u32 node, const Params &keys, void *buffer, u32 siz
     }
     Moment now = Now(host);
     char *record = static_cast<char *>(buffer);
-    const char *noise = Noise().data() + Mix(instance.seed ^ static_cast<u64>(now.elapsed)) % NOISE_SPAN;
+    const char *noise = Noise().data() + Hashed(instance.seed ^ static_cast<u64>(now.elapsed)) % NOISE_SPAN;
     for (u32 done = 0; done < size; done += NOISE_SPAN) {
         memcpy(record + done, noise, std::min<size_t>(size - done, NOISE_SPAN));
     }
@@ -196,9 +242,9 @@ KnfStatus List(void *context, u32 node, const Params &keys, Params *entries) {
 }
 
 // A histogram that is started again goes on; a reset keeps it running or stopped.
-void Track(Tracker *tracker, i64 elapsed, bool running, bool reset) {
-    tracker->collected = reset ? 0 : Collected(*tracker, elapsed);
-    tracker->since = elapsed;
+void Track(Tracker *tracker, i64 now, bool running, bool reset) {
+    tracker->collected = reset ? 0 : Collected(*tracker, now);
+    tracker->since = now;
     tracker->running = running;
 }
 
@@ -209,7 +255,7 @@ KnfStatus SetTrackHistos(Host *host, const Params &input, void *result, u32 size
     if (result != nullptr) {
         memset(result, 0, size);
     }
-    Track(&host->vcpuHistos, Now(*host).elapsed, input[0].number != 0, false);
+    Track(&host->vcpuHistos, Micros(Now(*host).life), input[0].number != 0, false);
     host->trackOption->text[NAME] = HostText(host, std::to_string(input[0].number));
     return STATUS_OK;
 }
@@ -228,7 +274,8 @@ KnfStatus SetPortHistogram(Host *host, const HistogramNodes &nodes, const Params
         return STATUS_BAD_PARAM;
     }
     bool running = operation == "start" || (operation == "reset" && tracker->running);
-    Track(tracker, Now(*host).elapsed, running, operation == "reset");
+    u64 count = Count(*found->second.entity, found->second.kind->fields[0].slot, Now(*host));
+    Track(tracker, static_cast<i64>(count), running, operation == "reset");
     return STATUS_OK;
 }
 
@@ -288,6 +335,11 @@ std::string HostKey(u32 node, const std::string &first, i64 second) {
 
 const std::string *HostText(Host *host, const std::string &text) {
     return &*host->texts.insert(text).first;
+}
+
+LoadCurve *HostLoad(Host *host, LoadKind kind, u64 seed) {
+    return kind == LoadKind::CONSTANT ? nullptr
+                                      : &host->loads.try_emplace({kind, seed}, LoadCurve{kind, seed}).first->second;
 }
 
 void HostAdd(Host *host, std::string key, const RecordKind *kind, const Entity *entity, Tracker *tracker) {

@@ -8,8 +8,6 @@
 
 namespace {
 
-constexpr i64 MAX_RATE = 1000000000000;
-
 bool IsBlank(char c) {
     return c == ' ' || c == '\t' || c == '\r';
 }

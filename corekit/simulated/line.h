@@ -12,6 +12,7 @@
 #include <vector>
 
 constexpr i64 MAX_ID = 0xffffffff;
+constexpr i64 MAX_RATE = 1000000000000;  // a second
 constexpr i64 MIN_I64 = std::numeric_limits<i64>::min();
 constexpr i64 MAX_I64 = std::numeric_limits<i64>::max();
 

@@ -136,8 +136,9 @@ def report(lines, options):
 
 
 def meter(host, options):
+    """Of a described host, or of the built-in one, whose description is empty."""
     pathlib.Path("host.txt").write_text(host)
-    environment = dict(os.environ, LD_PRELOAD=BUILD / "libfixed_clock.so", COREKIT_HOST="host.txt",
+    environment = dict(os.environ, LD_PRELOAD=BUILD / "libfixed_clock.so", COREKIT_HOST="host.txt" if host else "demo",
                        ASAN_OPTIONS="verify_asan_link_order=0")
     arguments = f"-A -t vqiW -i 10 -n 6 -o report.json {options}".split()
     done = subprocess.run([BUILD / "lan-meter", *arguments], env=environment, capture_output=True, text=True)
@@ -274,6 +275,13 @@ def test_text():
     check("text", run("report.json"), (DATA / "trouble.txt").read_text())
 
 
+def test_demo():
+    """The built-in host has two things wrong, and nothing else."""
+    meter("", "")
+    findings = json.loads(run("--json", "report.json"))["findings"]
+    check("demo", [found["rule"] + " " + found["port"]["name"] for found in findings], ["F1 db1", "F8 nic1"])
+
+
 def test_interrupted():
     """A run without an end has its summary when it is interrupted."""
     lines = [json.dumps(line).encode() + b"\n" for line in records(shared)]
@@ -304,5 +312,6 @@ def test_rules():
 if __name__ == "__main__":
     with tempfile.TemporaryDirectory() as directory:
         os.chdir(directory)
-        for test in (test_hosts, test_records, test_values, test_silence, test_text, test_interrupted, test_rules):
+        for test in (test_hosts, test_records, test_values, test_silence, test_text, test_demo, test_interrupted,
+                     test_rules):
             test()
