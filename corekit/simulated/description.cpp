@@ -8,7 +8,7 @@
 namespace {
 
 constexpr i64 MAX_RECORD = 1 << 20;
-constexpr i64 DEFAULT_UPTIME = 7384;  // seconds; two hours, three minutes and four seconds
+constexpr i64 DEFAULT_UPTIME = 7384;     // seconds; two hours, three minutes and four seconds
 constexpr i64 MAX_REPEATS = 1000000;     // lines that all count= of a description stand for
 constexpr size_t MAX_ENTRIES = 1000000;  // records and instance lists of a host
 
