@@ -1,7 +1,6 @@
 # What is installed, and the three Debian packages: the program; the reader of its reports, which a desk without any
 # host can use; and our library with its sources of nodes, the recorder and the command that tells what a host offers.
 # A host that has the library of its own does without the last, so that it never gets ours.
-include(GNUInstallDirs)
 
 install(TARGETS lan-meter RUNTIME DESTINATION ${CMAKE_INSTALL_SBINDIR} COMPONENT meter)
 install(FILES docs/man/lan-meter.8 DESTINATION ${CMAKE_INSTALL_MANDIR}/man8 COMPONENT meter)
