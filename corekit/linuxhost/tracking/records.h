@@ -30,6 +30,86 @@ static const __u64 PERIOD_LIMITS[LIMITS] = {1000,       2000,        5000,      
                                             10000000,   20000000,    50000000,    100000000,  200000000, 500000000,
                                             1000000000, NO_LIMITS_4, NO_LIMITS_4, NO_LIMITS_4};
 
+// A direction of an interface, from its own point of view; a key of a map too.
+enum PortDirection { PORT_RECEIVES, PORT_SENDS };
+struct TrackedPort {
+    __u32 netns;  // inode of the network namespace, as in /proc/self/ns/net; an index is used again in each
+    __u32 index;
+    __u32 direction;
+};
+enum PortFamily { PORT_SIZES, PORT_INTERVALS, PORT_FAMILIES };
+
+// What the maps hold at most. They take memory for what is watched, but slots and the heads of their tables.
+enum { PORT_SLOTS = 8192, THREADS_MOST = 65536, VECTORS_MOST = 8192, CPUS_MOST = 8192 };
+enum { HEADER_MOST = 64 };  // bytes of a link header; where none is known, a larger number stands
+
+// Of a port that is watched: what the reader orders, and what all CPUs share. Fills a cache line, as each packet writes
+// it.
+struct PortSlot {
+    __u32 wants;  // bits of PortFamily
+    __u32 epochs[PORT_FAMILIES];
+    __u32 reserved[1];
+    __u64 last;  // ns; when a packet last came, 0 before
+    __u64 reserved2[5];
+};
+
+// The least and the largest can't be told by differences. So each read begins a new epoch, and they are kept for that
+// and the one ahead, which the read then takes.
+struct Extremes {
+    __u64 min;
+    __u64 max;
+    __u32 epoch;  // another one's: no samples
+    __u32 reserved;
+};
+struct PortCounts {
+    __u64 sum;
+    __u64 buckets[BUCKETS];
+    struct Extremes spans[2];  // by the lowest bit of their epoch
+};
+struct PortRow {  // on one CPU
+    struct PortCounts families[PORT_FAMILIES];
+};
+
+enum ThreadPeriod { PERIOD_RUN, PERIOD_READY, PERIOD_WAIT, PERIODS };
+struct PeriodCounts {
+    __u64 sum;  // ns
+    __u64 buckets[BUCKETS];
+};
+struct ThreadRow {
+    __u64 born;   // ns of the boot clock when the thread began; 0 until it is seen
+    __u64 since;  // ns; when its period began
+    __u32 state;  // 1 + ThreadPeriod; 0 until it is known
+    __u32 reserved;
+    struct PeriodCounts periods[PERIODS];
+};
+
+struct VectorRow {  // on one CPU
+    __u64 count;
+    __u64 time;   // ns
+    __u64 since;  // ns; 0: no handler runs
+};
+
+#define NO_CACHE 0xffffffffU
+struct MoveRow {
+    __u64 born;
+    __u64 moves;
+};
+
+// A thread as its scheduler has it; what `known` lacks this kernel doesn't keep.
+enum TaskFigure { TASK_READY = 1, TASK_REMOTE_WAKEUPS = 2 };
+struct TaskSamples {
+    __u32 tid;
+    __u32 pid;
+    __u64 born;           // ns of the boot clock
+    __u64 run;            // ns, up to a tick old while it runs
+    __u64 ready;          // ns in a run queue
+    __u64 runs;           // times that it got a CPU; known with `ready`
+    __u64 migrations;     // between CPUs
+    __u64 remoteWakeups;  // counted only with kernel.sched_schedstats
+    __u32 known;
+    __u32 reserved;
+};
+
 static inline __u32 BucketOf(const __u64 limits[LIMITS], __u64 sample) {
     __u32 bucket = sample > limits[15] ? 16 : 0;
     bucket += sample > limits[bucket + 7] ? 8 : 0;

@@ -18,18 +18,9 @@ enum TrackingGroup : u32 {
     TRACKING_GROUPS
 };
 
-// A direction of an interface, from its own point of view. A sample is a packet as the driver and the stack hand it to
-// each other, which is what the interface counts as one: an offload packet is one sample. Of VLAN, macvlan and macvtap
-// interfaces no received packet can be seen: `portStart` answers UNSUPPORTED only for what it can tell by itself, so
+// Of a port. A sample is a packet as the driver and the stack hand it to each other, which is what the interface counts
+// as one: an offload packet is one sample. Of VLAN, macvlan and macvtap interfaces no received packet can be seen, so
 // don't ask for these.
-enum PortDirection : u32 { PORT_RECEIVES, PORT_SENDS };
-struct TrackedPort {
-    u32 netns;  // inode of the network namespace, as in /proc/self/ns/net; an index is used again in each
-    u32 index;
-    u32 direction;  // PortDirection
-};
-enum PortFamily : u32 { PORT_SIZES, PORT_INTERVALS, PORT_FAMILIES };
-
 struct PortSamples {
     u64 count;  // of all buckets
     u64 sum;    // bytes or ns
@@ -38,7 +29,6 @@ struct PortSamples {
     u64 buckets[BUCKETS];
 };
 
-enum ThreadPeriod : u32 { PERIOD_RUN, PERIOD_READY, PERIOD_WAIT, PERIODS };
 struct PeriodSamples {
     u64 count;
     u64 sum;  // ns
@@ -54,21 +44,6 @@ struct ThreadSamples {
 struct VectorSamples {
     u64 count;  // interrupts, one also where several devices share the number
     u64 time;   // ns in their handlers, without what those leave to softirqs and threads
-};
-
-// A thread as its scheduler has it; what `known` lacks this kernel doesn't keep.
-enum TaskFigure : u32 { TASK_READY = 1, TASK_REMOTE_WAKEUPS = 2 };
-struct TaskSamples {
-    u32 tid;
-    u32 pid;
-    u64 born;           // ns of CLOCK_BOOTTIME
-    u64 run;            // ns, up to a tick old while it runs
-    u64 ready;          // ns
-    u64 runs;           // times that it got a CPU
-    u64 migrations;     // between CPUs
-    u64 remoteWakeups;  // only with kernel.sched_schedstats
-    u32 known;
-    u32 reserved;
 };
 
 struct Tracking;  // one reader's; not for two threads at once

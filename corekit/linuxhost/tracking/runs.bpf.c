@@ -1,0 +1,71 @@
+// Periods of watched threads. The scheduler tells a thread's events one after another, under the lock of its run queue,
+// so that a row is written by one CPU at a time.
+#include "corekit/linuxhost/tracking/records.h"
+
+#include <bpf/bpf_helpers.h>
+
+char LICENSE[] SEC("license") = "Dual BSD/GPL";
+
+struct {
+    __uint(type, BPF_MAP_TYPE_HASH);
+    __uint(map_flags, BPF_F_NO_PREALLOC);
+    __uint(max_entries, THREADS_MOST);
+    __type(key, __u32);
+    __type(value, struct ThreadRow);
+} threads SEC(".maps");
+
+static __always_inline struct ThreadRow *Find(const struct task_struct *task) {
+    __u32 tid = (__u32)task->pid;
+    struct ThreadRow *row = bpf_map_lookup_elem(&threads, &tid);
+    if (row != 0 && row->born != task->start_boottime) {
+        if (row->born != 0) {
+            return 0;  // a later thread of this number
+        }
+        row->born = task->start_boottime;
+    }
+    return row;
+}
+
+// Ends a period and begins the next. The first one begins at an unknown time.
+static __always_inline void Step(struct ThreadRow *row, __u64 now, __u32 state) {
+    __u32 period = row->state - 1;
+    if (period < PERIODS) {
+        __u64 length = now - row->since;
+        row->periods[period].sum += length;
+        __u32 bucket = BucketOf(PERIOD_LIMITS, length);
+        if (bucket < BUCKETS) {
+            row->periods[period].buckets[bucket]++;
+        }
+    }
+    row->state = state;
+    row->since = now;
+}
+
+SEC("tp_btf/sched_switch")
+int Switch(__u64 *ctx) {
+    const struct task_struct *before = (const struct task_struct *)ctx[1];
+    struct ThreadRow *leaves = Find(before);
+    struct ThreadRow *enters = Find((const struct task_struct *)ctx[2]);
+    if (leaves == 0 && enters == 0) {
+        return 0;
+    }
+    __u64 now = bpf_ktime_get_ns();
+    if (leaves != 0) {
+        bool sleeps = (ctx[0] & 0xff) == 0 && before->__state != 0;  // not preempted, and not runnable
+        Step(leaves, now, sleeps ? PERIOD_WAIT + 1 : PERIOD_READY + 1);
+    }
+    if (enters != 0) {
+        Step(enters, now, PERIOD_RUN + 1);
+    }
+    return 0;
+}
+
+// Also told of a thread that had not yet gone to sleep.
+SEC("tp_btf/sched_wakeup")
+int Wakeup(__u64 *ctx) {
+    struct ThreadRow *row = Find((const struct task_struct *)ctx[0]);
+    if (row != 0 && row->state == PERIOD_WAIT + 1) {
+        Step(row, bpf_ktime_get_ns(), PERIOD_READY + 1);
+    }
+    return 0;
+}
