@@ -27,7 +27,8 @@ static __always_inline struct ThreadRow *Find(const struct task_struct *task) {
 }
 
 // Ends a period and begins the next. The first one begins at an unknown time.
-static __always_inline void Step(struct ThreadRow *row, __u64 now, __u32 state) {
+static __always_inline void Step(struct ThreadRow *row, __u32 state) {
+    __u64 now = bpf_ktime_get_ns();
     __u32 period = row->state - 1;
     if (period < PERIODS) {
         __u64 length = now - row->since;
@@ -41,21 +42,18 @@ static __always_inline void Step(struct ThreadRow *row, __u64 now, __u32 state) 
     row->since = now;
 }
 
+// A thread that leaves its CPU sleeps, unless it was preempted or is still runnable.
 SEC("tp_btf/sched_switch")
 int Switch(__u64 *ctx) {
-    const struct task_struct *before = (const struct task_struct *)ctx[1];
-    struct ThreadRow *leaves = Find(before);
-    struct ThreadRow *enters = Find((const struct task_struct *)ctx[2]);
-    if (leaves == 0 && enters == 0) {
-        return 0;
+    const struct task_struct *leaves = (const struct task_struct *)ctx[1];
+    struct ThreadRow *row = Find(leaves);
+    if (row != 0) {
+        bool sleeps = (ctx[0] & 0xff) == 0 && leaves->__state != 0;
+        Step(row, sleeps ? PERIOD_WAIT + 1 : PERIOD_READY + 1);
     }
-    __u64 now = bpf_ktime_get_ns();
-    if (leaves != 0) {
-        bool sleeps = (ctx[0] & 0xff) == 0 && before->__state != 0;  // not preempted, and not runnable
-        Step(leaves, now, sleeps ? PERIOD_WAIT + 1 : PERIOD_READY + 1);
-    }
-    if (enters != 0) {
-        Step(enters, now, PERIOD_RUN + 1);
+    row = Find((const struct task_struct *)ctx[2]);
+    if (row != 0) {
+        Step(row, PERIOD_RUN + 1);
     }
     return 0;
 }
@@ -65,7 +63,7 @@ SEC("tp_btf/sched_wakeup")
 int Wakeup(__u64 *ctx) {
     struct ThreadRow *row = Find((const struct task_struct *)ctx[0]);
     if (row != 0 && row->state == PERIOD_WAIT + 1) {
-        Step(row, bpf_ktime_get_ns(), PERIOD_READY + 1);
+        Step(row, PERIOD_READY + 1);
     }
     return 0;
 }
