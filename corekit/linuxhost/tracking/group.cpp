@@ -130,9 +130,9 @@ void MapDelete(int map, const void *key) {
     Bpf(BPF_MAP_DELETE_ELEM, &attributes);
 }
 
-int MapLookupCpus(Tracking *tracking, int map, u32 key, u32 size) {
+int MapLookupCpus(Tracking *tracking, int map, const void *key, size_t size) {
     tracking->buffer.resize(size * tracking->cpus.size());
-    return MapLookup(map, &key, tracking->buffer.data());
+    return MapLookup(map, key, tracking->buffer.data());
 }
 
 Outcome Fail(Tracking *tracking, Outcome outcome, const std::string &reason) {

@@ -7,12 +7,12 @@
 char LICENSE[] SEC("license") = "Dual BSD/GPL";
 
 struct {
-    __uint(type, BPF_MAP_TYPE_HASH);
+    __uint(type, BPF_MAP_TYPE_PERCPU_HASH);
     __uint(map_flags, BPF_F_NO_PREALLOC);
     __uint(max_entries, PORT_SLOTS);
     __type(key, struct TrackedPort);
-    __type(value, __u32);
-} watched SEC(".maps");
+    __type(value, struct PortRow);
+} rows SEC(".maps");
 
 struct {
     __uint(type, BPF_MAP_TYPE_ARRAY);
@@ -22,13 +22,8 @@ struct {
     __type(value, struct PortSlot);
 } slots SEC(".maps");
 
-struct {
-    __uint(type, BPF_MAP_TYPE_PERCPU_HASH);
-    __uint(map_flags, BPF_F_NO_PREALLOC);
-    __uint(max_entries, PORT_SLOTS);
-    __type(key, __u32);
-    __type(value, struct PortRow);
-} rows SEC(".maps");
+// Bits of the indices that are watched in any namespace, which spares all other packets the rest.
+__u64 filter[FILTER_WORDS];
 
 static __always_inline void Count(struct PortCounts *counts, const __u64 *limits, __u32 epoch, __u64 sample) {
     struct Extremes *span = &counts->spans[epoch & 1];
@@ -57,14 +52,14 @@ static __always_inline void CountInterval(struct PortSlot *slot, struct PortRow 
 }
 
 static __always_inline int Packet(const struct net_device *dev, __u32 direction, __u32 bytes) {
-    struct TrackedPort port = {dev->nd_net.net->ns.inum, (__u32)dev->ifindex, direction};
-    const __u32 *number = bpf_map_lookup_elem(&watched, &port);
-    if (number == 0) {
+    __u32 index = (__u32)dev->ifindex;
+    if ((filter[index / 64 % FILTER_WORDS] >> index % 64 & 1) == 0) {
         return 0;
     }
-    struct PortSlot *slot = bpf_map_lookup_elem(&slots, number);
-    struct PortRow *row = bpf_map_lookup_elem(&rows, number);
-    if (slot == 0 || row == 0) {
+    struct TrackedPort port = {dev->nd_net.net->ns.inum, index, direction};
+    struct PortRow *row = bpf_map_lookup_elem(&rows, &port);
+    struct PortSlot *slot = row != 0 ? bpf_map_lookup_elem(&slots, &row->slot) : 0;
+    if (slot == 0) {
         return 0;
     }
     if ((slot->wants & 1 << PORT_SIZES) != 0) {

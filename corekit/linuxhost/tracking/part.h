@@ -36,8 +36,10 @@ struct Tracking {
     std::vector<char> buffer;  // for a value of each of them
 
     std::map<TrackedPort, WatchedPort, PortBefore> ports;
-    PortSlot *slots = nullptr;  // shared with the kernel while packets are counted
-    std::deque<u32> freeSlots;  // the one that rested longest comes first
+    PortSlot *slots = nullptr;    // shared with the kernel while packets are counted
+    u64 *filter = nullptr;        // the same
+    std::vector<u32> filterUses;  // of each bit
+    std::deque<u32> freeSlots;    // the one that rested longest comes first
     std::unordered_set<u32> runs;
     std::unordered_set<u32> moves;
     std::unordered_set<u32> vectors;
@@ -51,7 +53,7 @@ int MapUpdate(int map, const void *key, const void *value, u64 flags);
 int MapLookup(int map, const void *key, void *value);
 void MapDelete(int map, const void *key);
 // A value of `size` bytes of each CPU, all of them in tracking->buffer.
-int MapLookupCpus(Tracking *tracking, int map, u32 key, u32 size);
+int MapLookupCpus(Tracking *tracking, int map, const void *key, size_t size);
 // Tells why, and returns the outcome.
 Outcome Fail(Tracking *tracking, Outcome outcome, const std::string &reason);
 // Of what the kernel refused while it was asked for.

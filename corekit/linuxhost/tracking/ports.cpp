@@ -2,12 +2,13 @@
 
 #include <algorithm>
 #include <cstring>
+#include <numeric>
 #include <sys/mman.h>
 #include <tuple>
 
 namespace {
 
-enum { MAP_WATCHED, MAP_SLOTS, MAP_ROWS };  // in the order of packets.bpf.c
+enum { MAP_ROWS, MAP_SLOTS, MAP_FILTER };  // in the order of packets.bpf.c
 
 int Map(const Tracking &tracking, u32 map) {
     return tracking.groups[TRACKING_PACKETS].programs.maps[map];
@@ -19,52 +20,71 @@ void Order(Number *where, Number value) {
     __atomic_store_n(where, value, __ATOMIC_RELEASE);
 }
 
+constexpr size_t SLOTS_SIZE = PORT_SLOTS * sizeof(PortSlot);
+constexpr size_t FILTER_SIZE = 4096;  // a page
+
+void *Share(const Tracking &tracking, u32 map, size_t size) {
+    void *memory = mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_SHARED, Map(tracking, map), 0);
+    return memory != MAP_FAILED ? memory : nullptr;
+}
+
+template <typename Entry>
+void Unshare(Entry **memory, size_t size) {
+    if (*memory != nullptr) {
+        munmap(*memory, size);
+        *memory = nullptr;
+    }
+}
+
+void CloseUnused(Tracking *tracking) {
+    if (tracking->ports.empty()) {
+        Unshare(&tracking->slots, SLOTS_SIZE);
+        Unshare(&tracking->filter, FILTER_SIZE);
+        GroupClose(tracking, TRACKING_PACKETS);
+    }
+}
+
 Outcome Open(Tracking *tracking) {
     if (Outcome outcome = GroupNeed(tracking, TRACKING_PACKETS); outcome != FINE || tracking->slots != nullptr) {
         return outcome;
     }
-    void *slots =
-        mmap(nullptr, PORT_SLOTS * sizeof(PortSlot), PROT_READ | PROT_WRITE, MAP_SHARED, Map(*tracking, MAP_SLOTS), 0);
-    if (slots == MAP_FAILED) {
-        Outcome outcome = FailWith(tracking, -errno, "packets");
-        GroupClose(tracking, TRACKING_PACKETS);
-        return outcome;
+    tracking->slots = static_cast<PortSlot *>(Share(*tracking, MAP_SLOTS, SLOTS_SIZE));
+    tracking->filter = static_cast<u64 *>(Share(*tracking, MAP_FILTER, FILTER_SIZE));
+    if (tracking->slots == nullptr || tracking->filter == nullptr) {
+        return FailWith(tracking, -errno, "packets");
     }
-    tracking->slots = static_cast<PortSlot *>(slots);
     tracking->freeSlots.resize(PORT_SLOTS);
-    for (u32 i = 0; i < PORT_SLOTS; i++) {
-        tracking->freeSlots[i] = i;
-    }
+    tracking->filterUses.assign(FILTER_WORDS * 64, 0);
+    std::iota(tracking->freeSlots.begin(), tracking->freeSlots.end(), 0);
     return FINE;
 }
 
-void CloseUnused(Tracking *tracking) {
-    if (tracking->ports.empty() && tracking->slots != nullptr) {
-        munmap(tracking->slots, PORT_SLOTS * sizeof(PortSlot));
-        tracking->slots = nullptr;
-        GroupClose(tracking, TRACKING_PACKETS);
-    }
+// Several indices may share a bit.
+void Admit(Tracking *tracking, u32 index, bool enter) {
+    u32 bit = index % (FILTER_WORDS * 64);
+    u32 uses = tracking->filterUses[bit] += enter ? 1 : ~0U;
+    u64 *word = &tracking->filter[bit / 64];
+    u64 mask = 1ULL << bit % 64;
+    Order(word, uses != 0 ? *word | mask : *word & ~mask);
 }
 
-// A row of zeros for each CPU, then the way to it.
+// A row of zeros for each CPU.
 int Insert(Tracking *tracking, const TrackedPort &port, u32 slot) {
     tracking->slots[slot] = PortSlot();
-    tracking->buffer.assign(sizeof(PortRow) * tracking->cpus.size(), 0);
-    int error = MapUpdate(Map(*tracking, MAP_ROWS), &slot, tracking->buffer.data(), BPF_ANY);
-    if (error == 0) {
-        error = MapUpdate(Map(*tracking, MAP_WATCHED), &port, &slot, BPF_ANY);
+    PortRow row = {};
+    row.slot = slot;
+    tracking->buffer.resize(sizeof row * tracking->cpus.size());
+    for (size_t i = 0; i < tracking->cpus.size(); i++) {
+        memcpy(tracking->buffer.data() + i * sizeof row, &row, sizeof row);
     }
-    if (error != 0) {
-        MapDelete(Map(*tracking, MAP_ROWS), &slot);
-    }
-    return error;
+    return MapUpdate(Map(*tracking, MAP_ROWS), &port, tracking->buffer.data(), BPF_ANY);
 }
 
 Outcome Watch(Tracking *tracking, const TrackedPort &port, WatchedPort **watched) {
     auto found = tracking->ports.find(port);
     if (found == tracking->ports.end()) {
         if (tracking->freeSlots.empty()) {
-            return Fail(tracking, BROKEN, std::to_string(PORT_SLOTS / 2) + " ports are the most that can be watched");
+            return Fail(tracking, BROKEN, std::to_string(PORT_SLOTS / 2) + " ports are the most");
         }
         u32 slot = tracking->freeSlots.front();
         if (int error = Insert(tracking, port, slot); error != 0) {
@@ -72,9 +92,18 @@ Outcome Watch(Tracking *tracking, const TrackedPort &port, WatchedPort **watched
         }
         tracking->freeSlots.pop_front();
         found = tracking->ports.emplace(port, WatchedPort{slot, {}}).first;
+        Admit(tracking, port.index, true);
     }
     *watched = &found->second;
     return FINE;
+}
+
+void Unwatch(Tracking *tracking, std::map<TrackedPort, WatchedPort, PortBefore>::iterator port) {
+    Admit(tracking, port->first.index, false);
+    MapDelete(Map(*tracking, MAP_ROWS), &port->first);
+    tracking->freeSlots.push_back(port->second.slot);
+    tracking->ports.erase(port);
+    CloseUnused(tracking);
 }
 
 void Merge(const Extremes &span, u32 epoch, PortSamples *samples, bool *any) {
@@ -86,10 +115,10 @@ void Merge(const Extremes &span, u32 epoch, PortSamples *samples, bool *any) {
 }
 
 // The sum over all CPUs since the row was made. Ends the epoch.
-Outcome ReadRow(Tracking *tracking, u32 slot, PortFamily family, PortSamples *samples) {
+Outcome ReadRow(Tracking *tracking, const TrackedPort &port, u32 slot, PortFamily family, PortSamples *samples) {
     u32 epoch = tracking->slots[slot].epochs[family];
     Order(&tracking->slots[slot].epochs[family], epoch + 1);
-    if (int error = MapLookupCpus(tracking, Map(*tracking, MAP_ROWS), slot, sizeof(PortRow)); error != 0) {
+    if (int error = MapLookupCpus(tracking, Map(*tracking, MAP_ROWS), &port, sizeof(PortRow)); error != 0) {
         return FailWith(tracking, error, "packets");
     }
     *samples = {};
@@ -105,14 +134,6 @@ Outcome ReadRow(Tracking *tracking, u32 slot, PortFamily family, PortSamples *sa
         Merge(counts.spans[epoch & 1], epoch, samples, &any);
     }
     return FINE;
-}
-
-void Release(Tracking *tracking, std::map<TrackedPort, WatchedPort, PortBefore>::iterator port) {
-    MapDelete(Map(*tracking, MAP_WATCHED), &port->first);
-    MapDelete(Map(*tracking, MAP_ROWS), &port->second.slot);
-    tracking->freeSlots.push_back(port->second.slot);
-    tracking->ports.erase(port);
-    CloseUnused(tracking);
 }
 
 }  // namespace
@@ -136,7 +157,7 @@ Outcome PortStart(Tracking *tracking, const TrackedPort *port, PortFamily family
         return FINE;
     }
     PortSamples before = {};
-    outcome = ReadRow(tracking, watched->slot, family, &before);
+    outcome = ReadRow(tracking, *port, watched->slot, family, &before);
     if (outcome == FINE) {
         watched->bases[family].sum = before.sum;
         std::copy(std::begin(before.buckets), std::end(before.buckets), watched->bases[family].buckets);
@@ -145,7 +166,7 @@ Outcome PortStart(Tracking *tracking, const TrackedPort *port, PortFamily family
         }
         Order(&slot->wants, slot->wants | 1U << family);
     } else if (slot->wants == 0) {
-        Release(tracking, tracking->ports.find(*port));
+        Unwatch(tracking, tracking->ports.find(*port));
     }
     return outcome;
 }
@@ -155,7 +176,7 @@ Outcome PortRead(Tracking *tracking, const TrackedPort *port, PortFamily family,
     if (found == tracking->ports.end() || (tracking->slots[found->second.slot].wants & 1U << family) == 0) {
         return Fail(tracking, GONE, "not watched");
     }
-    Outcome outcome = ReadRow(tracking, found->second.slot, family, samples);
+    Outcome outcome = ReadRow(tracking, *port, found->second.slot, family, samples);
     const PortCounts &base = found->second.bases[family];
     samples->sum -= base.sum;
     for (u32 bucket = 0; bucket < BUCKETS; bucket++) {
@@ -173,7 +194,7 @@ void PortStop(Tracking *tracking, const TrackedPort *port, PortFamily family) {
     PortSlot *slot = &tracking->slots[found->second.slot];
     Order(&slot->wants, slot->wants & ~(1U << family));
     if (slot->wants == 0) {
-        Release(tracking, found);
+        Unwatch(tracking, found);
     }
 }
 

@@ -12,7 +12,7 @@
 // all. Tables are filled up to one length, so that one search of five steps serves all of them.
 enum { LIMITS = 31 };
 enum { SIZE_BUCKETS = 12, INTERVAL_BUCKETS = 19, PERIOD_BUCKETS = 20, BUCKETS = 20 };  // the last one has no limit
-#define NO_LIMIT 0xffffffffffffffffULL
+#define NO_LIMIT 0x7fffffffffffffffULL
 #define NO_LIMITS_4 NO_LIMIT, NO_LIMIT, NO_LIMIT, NO_LIMIT
 
 // Bytes, Ethernet header included, check sum not.
@@ -41,7 +41,8 @@ enum PortFamily { PORT_SIZES, PORT_INTERVALS, PORT_FAMILIES };
 
 // What the maps hold at most. They take memory for what is watched, but slots and the heads of their tables.
 enum { PORT_SLOTS = 8192, THREADS_MOST = 65536, VECTORS_MOST = 8192, CPUS_MOST = 8192 };
-enum { HEADER_MOST = 64 };  // bytes of a link header; where none is known, a larger number stands
+enum { FILTER_WORDS = 64 };  // of 64 bits
+enum { HEADER_MOST = 64 };   // bytes of a link header; where none is known, a larger number stands
 
 // Of a port that is watched: what the reader orders, and what all CPUs share. Fills a cache line, as each packet writes
 // it.
@@ -67,6 +68,8 @@ struct PortCounts {
     struct Extremes spans[2];  // by the lowest bit of their epoch
 };
 struct PortRow {  // on one CPU
+    __u32 slot;
+    __u32 reserved;
     struct PortCounts families[PORT_FAMILIES];
 };
 
@@ -110,10 +113,11 @@ struct TaskSamples {
     __u32 reserved;
 };
 
+// Without branches, which no CPU could foretell. Samples and limits lie below 2^63.
 static inline __u32 BucketOf(const __u64 limits[LIMITS], __u64 sample) {
-    __u32 bucket = sample > limits[15] ? 16 : 0;
-    bucket += sample > limits[bucket + 7] ? 8 : 0;
-    bucket += sample > limits[bucket + 3] ? 4 : 0;
-    bucket += sample > limits[bucket + 1] ? 2 : 0;
-    return bucket + (sample > limits[bucket] ? 1 : 0);
+    __u64 bucket = (limits[15] - sample) >> 63 << 4;
+    bucket += (limits[bucket + 7] - sample) >> 63 << 3;
+    bucket += (limits[bucket + 3] - sample) >> 63 << 2;
+    bucket += (limits[bucket + 1] - sample) >> 63 << 1;
+    return (__u32)(bucket + ((limits[bucket] - sample) >> 63));
 }

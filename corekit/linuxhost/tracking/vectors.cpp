@@ -34,7 +34,7 @@ Outcome VectorRead(Tracking *tracking, u32 irq, u32 cpu, VectorSamples *samples)
     if (tracking->vectors.count(irq) == 0) {
         return Fail(tracking, GONE, "not watched");
     }
-    if (int error = MapLookupCpus(tracking, Map(*tracking), irq, sizeof(VectorRow)); error != 0) {
+    if (int error = MapLookupCpus(tracking, Map(*tracking), &irq, sizeof(VectorRow)); error != 0) {
         return FailWith(tracking, error, "interrupts");
     }
     auto at = std::find(tracking->cpus.begin(), tracking->cpus.end(), cpu);
