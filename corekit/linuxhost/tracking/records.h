@@ -62,10 +62,10 @@ struct Extremes {
     __u32 epoch;  // another one's: no samples
     __u32 reserved;
 };
-struct PortCounts {
+struct PortCounts {            // each sample touches the head and a bucket: two cache lines
+    struct Extremes spans[2];  // by the lowest bit of their epoch
     __u64 sum;
     __u64 buckets[BUCKETS];
-    struct Extremes spans[2];  // by the lowest bit of their epoch
 };
 struct PortRow {  // on one CPU
     __u32 slot;
