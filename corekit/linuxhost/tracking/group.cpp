@@ -1,7 +1,9 @@
 #include "corekit/linuxhost/tracking/part.h"
 
+#include <algorithm>
 #include <cstring>
 #include <fcntl.h>
+#include <sys/mman.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
@@ -15,9 +17,11 @@ struct GroupProgram {
     int (*load)(Loaded *loaded);
     bool attaches;  // to tracepoints
     bool threads;   // knows threads by their number
+    int sharedMap = -1;
+    const __u64 *limits[2] = {};
 };
-constexpr GroupProgram PROGRAMS[] = {{"packets", LoadPackets, true, false},
-                                     {"periods of threads", LoadRuns, true, true},
+constexpr GroupProgram PROGRAMS[] = {{"packets", LoadPackets, true, false, 2, {SIZE_LIMITS, INTERVAL_LIMITS}},
+                                     {"periods of threads", LoadRuns, true, true, 1, {PERIOD_LIMITS}},
                                      {"interrupts", LoadVectors, true, false},
                                      {"moves between caches", LoadMoves, true, true},
                                      {"figures of threads", LoadTasks, false, true}};
@@ -99,6 +103,34 @@ Outcome Load(Tracking *tracking, TrackingGroup group) {
                     : FailWith(tracking, error, program.name);
 }
 
+Outcome Share(Tracking *tracking, TrackingGroup id) {
+    const GroupProgram &program = PROGRAMS[id];
+    Group *group = &tracking->groups[id];
+    if (program.sharedMap < 0) {
+        return FINE;
+    }
+    group->shared = static_cast<Shared *>(MapShare(group->programs.maps[program.sharedMap], sizeof(Shared)));
+    if (group->shared == nullptr) {
+        return FailWith(tracking, -errno, program.name);
+    }
+    for (u32 i = 0; i < 2 && program.limits[i] != nullptr; i++) {
+        std::copy(program.limits[i], program.limits[i] + LIMITS, group->shared->limits[i]);
+    }
+    group->uses.assign(FILTER_BITS, 0);
+    return FINE;
+}
+
+Outcome AttachAll(Tracking *tracking, TrackingGroup id) {
+    Group *group = &tracking->groups[id];
+    for (u32 i = 0; i < LOADED_PROGRAMS && group->programs.programs[i] >= 0; i++) {
+        group->links[i] = Attach(group->programs.programs[i]);
+        if (group->links[i] < 0) {
+            return FailWith(tracking, group->links[i], PROGRAMS[id].name);
+        }
+    }
+    return FINE;
+}
+
 }  // namespace
 
 int Bpf(bpf_cmd command, bpf_attr *attributes) {
@@ -135,6 +167,20 @@ int MapLookupCpus(Tracking *tracking, int map, const void *key, size_t size) {
     return MapLookup(map, key, tracking->buffer.data());
 }
 
+void *MapShare(int map, size_t size) {
+    void *memory = mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_SHARED, map, 0);
+    return memory != MAP_FAILED ? memory : nullptr;
+}
+
+void FilterAdmit(Tracking *tracking, TrackingGroup id, u32 number, bool enter) {
+    Group *group = &tracking->groups[id];
+    u32 bit = number % FILTER_BITS;
+    u32 uses = group->uses[bit] += enter ? 1 : ~0U;  // several numbers may share one
+    __u64 *word = &group->shared->filter[bit / 64];
+    __u64 mask = 1ULL << bit % 64;
+    __atomic_store_n(word, uses != 0 ? *word | mask : *word & ~mask, __ATOMIC_RELEASE);
+}
+
 Outcome Fail(Tracking *tracking, Outcome outcome, const std::string &reason) {
     tracking->reason = reason;
     return outcome;
@@ -153,24 +199,28 @@ Outcome FailWith(Tracking *tracking, int error, const char *what) {
 }
 
 Outcome GroupNeed(Tracking *tracking, TrackingGroup id) {
-    Group *group = &tracking->groups[id];
-    if (group->loaded) {
+    if (tracking->groups[id].loaded) {
         return FINE;
     }
     Outcome outcome = Load(tracking, id);
-    for (u32 i = 0; outcome == FINE && PROGRAMS[id].attaches && i < LOADED_PROGRAMS; i++) {
-        int program = group->programs.programs[i];
-        group->links[i] = program >= 0 ? Attach(program) : -1;
-        if (program >= 0 && group->links[i] < 0) {
-            outcome = FailWith(tracking, group->links[i], PROGRAMS[id].name);
-            GroupClose(tracking, id);
-        }
+    if (outcome == FINE) {
+        outcome = Share(tracking, id);
+    }
+    if (outcome == FINE && PROGRAMS[id].attaches) {
+        outcome = AttachAll(tracking, id);
+    }
+    if (outcome != FINE) {
+        GroupClose(tracking, id);
     }
     return outcome;
 }
 
 void GroupClose(Tracking *tracking, TrackingGroup id) {
     Group *group = &tracking->groups[id];
+    if (group->shared != nullptr) {
+        munmap(group->shared, sizeof(Shared));
+        group->shared = nullptr;
+    }
     for (int &link : group->links) {
         Close(&link);
     }

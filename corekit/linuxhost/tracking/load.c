@@ -1,5 +1,7 @@
 #include "corekit/linuxhost/tracking/load.h"
 
+#include "corekit/linuxhost/tracking/records.h"
+
 #include <errno.h>
 #include <linux/bpf.h>
 #include <moves.lskel.h>

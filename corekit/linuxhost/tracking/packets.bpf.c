@@ -22,8 +22,7 @@ struct {
     __type(value, struct PortSlot);
 } slots SEC(".maps");
 
-// Bits of the indices that are watched in any namespace, which spares all other packets the rest.
-__u64 filter[FILTER_WORDS];
+struct Shared shared;
 
 static __always_inline void Count(struct PortCounts *counts, const __u64 *limits, __u32 epoch, __u64 sample) {
     struct Extremes *span = &counts->spans[epoch & 1];
@@ -46,14 +45,14 @@ static __always_inline void CountInterval(struct PortSlot *slot, struct PortRow 
     __u64 now = bpf_ktime_get_ns();
     __u64 last = __sync_lock_test_and_set(&slot->last, now);
     if (last != 0) {
-        Count(&row->families[PORT_INTERVALS], INTERVAL_LIMITS, slot->epochs[PORT_INTERVALS],
+        Count(&row->families[PORT_INTERVALS], shared.limits[PORT_INTERVALS], slot->epochs[PORT_INTERVALS],
               now > last ? now - last : 0);
     }
 }
 
 static __always_inline int Packet(const struct net_device *dev, __u32 direction, __u32 bytes) {
     __u32 index = (__u32)dev->ifindex;
-    if ((filter[index / 64 % FILTER_WORDS] >> index % 64 & 1) == 0) {
+    if ((shared.filter[index / 64 % FILTER_WORDS] >> index % 64 & 1) == 0) {
         return 0;
     }
     struct TrackedPort port = {dev->nd_net.net->ns.inum, index, direction};
@@ -63,7 +62,7 @@ static __always_inline int Packet(const struct net_device *dev, __u32 direction,
         return 0;
     }
     if ((slot->wants & 1 << PORT_SIZES) != 0) {
-        Count(&row->families[PORT_SIZES], SIZE_LIMITS, slot->epochs[PORT_SIZES], bytes);
+        Count(&row->families[PORT_SIZES], shared.limits[PORT_SIZES], slot->epochs[PORT_SIZES], bytes);
     }
     if ((slot->wants & 1 << PORT_INTERVALS) != 0) {
         CountInterval(slot, row);

@@ -14,6 +14,8 @@
 struct Group {
     bool loaded = false;
     Loaded programs{};
+    Shared *shared = nullptr;  // with its programs
+    std::vector<u32> uses;     // of each bit of its filter
     int links[LOADED_PROGRAMS] = {-1, -1, -1, -1, -1, -1};
     bool asked = false;
     Outcome answer{};    // when it was asked
@@ -36,10 +38,8 @@ struct Tracking {
     std::vector<char> buffer;  // for a value of each of them
 
     std::map<TrackedPort, WatchedPort, PortBefore> ports;
-    PortSlot *slots = nullptr;    // shared with the kernel while packets are counted
-    u64 *filter = nullptr;        // the same
-    std::vector<u32> filterUses;  // of each bit
-    std::deque<u32> freeSlots;    // the one that rested longest comes first
+    PortSlot *slots = nullptr;  // shared with the kernel while packets are counted
+    std::deque<u32> freeSlots;  // the one that rested longest comes first
     std::unordered_set<u32> runs;
     std::unordered_set<u32> moves;
     std::unordered_set<u32> vectors;
@@ -62,6 +62,11 @@ Outcome GroupAsk(Tracking *tracking, TrackingGroup group);
 // Loads a group and attaches it unless that was done. After a failure it is not loaded.
 Outcome GroupNeed(Tracking *tracking, TrackingGroup group);
 void GroupClose(Tracking *tracking, TrackingGroup group);
+
+// As a number enters what a group may watch, and as it leaves.
+void FilterAdmit(Tracking *tracking, TrackingGroup group, u32 number, bool enter);
+// Memory of a map; null with errno when it can't be had.
+void *MapShare(int map, size_t size);
 
 // ports.cpp
 Outcome PortStart(Tracking *tracking, const TrackedPort *port, PortFamily family);

@@ -8,7 +8,7 @@
 
 namespace {
 
-enum { MAP_ROWS, MAP_SLOTS, MAP_FILTER };  // in the order of packets.bpf.c
+enum { MAP_ROWS, MAP_SLOTS };  // in the order of packets.bpf.c
 
 int Map(const Tracking &tracking, u32 map) {
     return tracking.groups[TRACKING_PACKETS].programs.maps[map];
@@ -21,25 +21,13 @@ void Order(Number *where, Number value) {
 }
 
 constexpr size_t SLOTS_SIZE = PORT_SLOTS * sizeof(PortSlot);
-constexpr size_t FILTER_SIZE = 4096;  // a page
-
-void *Share(const Tracking &tracking, u32 map, size_t size) {
-    void *memory = mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_SHARED, Map(tracking, map), 0);
-    return memory != MAP_FAILED ? memory : nullptr;
-}
-
-template <typename Entry>
-void Unshare(Entry **memory, size_t size) {
-    if (*memory != nullptr) {
-        munmap(*memory, size);
-        *memory = nullptr;
-    }
-}
 
 void CloseUnused(Tracking *tracking) {
     if (tracking->ports.empty()) {
-        Unshare(&tracking->slots, SLOTS_SIZE);
-        Unshare(&tracking->filter, FILTER_SIZE);
+        if (tracking->slots != nullptr) {
+            munmap(tracking->slots, SLOTS_SIZE);
+        }
+        tracking->slots = nullptr;
         GroupClose(tracking, TRACKING_PACKETS);
     }
 }
@@ -48,24 +36,10 @@ Outcome Open(Tracking *tracking) {
     if (Outcome outcome = GroupNeed(tracking, TRACKING_PACKETS); outcome != FINE || tracking->slots != nullptr) {
         return outcome;
     }
-    tracking->slots = static_cast<PortSlot *>(Share(*tracking, MAP_SLOTS, SLOTS_SIZE));
-    tracking->filter = static_cast<u64 *>(Share(*tracking, MAP_FILTER, FILTER_SIZE));
-    if (tracking->slots == nullptr || tracking->filter == nullptr) {
-        return FailWith(tracking, -errno, "packets");
-    }
+    tracking->slots = static_cast<PortSlot *>(MapShare(Map(*tracking, MAP_SLOTS), SLOTS_SIZE));
     tracking->freeSlots.resize(PORT_SLOTS);
-    tracking->filterUses.assign(FILTER_WORDS * 64, 0);
     std::iota(tracking->freeSlots.begin(), tracking->freeSlots.end(), 0);
-    return FINE;
-}
-
-// Several indices may share a bit.
-void Admit(Tracking *tracking, u32 index, bool enter) {
-    u32 bit = index % (FILTER_WORDS * 64);
-    u32 uses = tracking->filterUses[bit] += enter ? 1 : ~0U;
-    u64 *word = &tracking->filter[bit / 64];
-    u64 mask = 1ULL << bit % 64;
-    Order(word, uses != 0 ? *word | mask : *word & ~mask);
+    return tracking->slots != nullptr ? FINE : FailWith(tracking, -errno, "packets");
 }
 
 // A row of zeros for each CPU.
@@ -92,14 +66,14 @@ Outcome Watch(Tracking *tracking, const TrackedPort &port, WatchedPort **watched
         }
         tracking->freeSlots.pop_front();
         found = tracking->ports.emplace(port, WatchedPort{slot, {}}).first;
-        Admit(tracking, port.index, true);
+        FilterAdmit(tracking, TRACKING_PACKETS, port.index, true);
     }
     *watched = &found->second;
     return FINE;
 }
 
 void Unwatch(Tracking *tracking, std::map<TrackedPort, WatchedPort, PortBefore>::iterator port) {
-    Admit(tracking, port->first.index, false);
+    FilterAdmit(tracking, TRACKING_PACKETS, port->first.index, false);
     MapDelete(Map(*tracking, MAP_ROWS), &port->first);
     tracking->freeSlots.push_back(port->second.slot);
     tracking->ports.erase(port);

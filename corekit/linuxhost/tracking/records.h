@@ -2,10 +2,10 @@
 // Plain structs of fixed integers, in the C that both compilers read. Counters only grow.
 #pragma once
 
-#ifdef __cplusplus
-#include <linux/types.h>
-#else
+#ifdef __bpf__
 #include "corekit/linuxhost/tracking/kernel_types.h"
+#else
+#include <linux/types.h>
 #endif
 
 // A sample lies in the first bucket whose limit it doesn't exceed, and in the one behind the last limit when it exceeds
@@ -40,9 +40,16 @@ struct TrackedPort {
 enum PortFamily { PORT_SIZES, PORT_INTERVALS, PORT_FAMILIES };
 
 // What the maps hold at most. They take memory for what is watched, but slots and the heads of their tables.
-enum { PORT_SLOTS = 8192, THREADS_MOST = 65536, VECTORS_MOST = 8192, CPUS_MOST = 8192 };
-enum { FILTER_WORDS = 64 };  // of 64 bits
-enum { HEADER_MOST = 64 };   // bytes of a link header; where none is known, a larger number stands
+enum { PORT_SLOTS = 8192, THREADS_MOST = 2048, VECTORS_MOST = 2048, CPUS_MOST = 8192 };
+
+// One page that each sample needs, shared with the reader, who fills it.
+enum { FILTER_WORDS = 256, FILTER_BITS = 64 * FILTER_WORDS };
+struct Shared {
+    __u64 filter[FILTER_WORDS];  // a bit for each number that may be watched, by its lowest bits
+    __u64 limits[2][LIMITS];
+};
+
+enum { HEADER_MOST = 64 };  // bytes of a link header; where none is known, a larger number stands
 
 // Of a port that is watched: what the reader orders, and what all CPUs share. Fills a cache line, as each packet writes
 // it.
@@ -79,7 +86,8 @@ struct PeriodCounts {
     __u64 buckets[BUCKETS];
 };
 struct ThreadRow {
-    __u64 born;   // ns of the boot clock when the thread began; 0 until it is seen
+    __u64 task;   // the kernel's address of it; 0 until it is seen
+    __u64 born;   // ns of the boot clock when it began
     __u64 since;  // ns; when its period began
     __u32 state;  // 1 + ThreadPeriod; 0 until it is known
     __u32 reserved;

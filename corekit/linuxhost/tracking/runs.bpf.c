@@ -14,16 +14,20 @@ struct {
     __type(value, struct ThreadRow);
 } threads SEC(".maps");
 
+struct Shared shared;
+
+// Of the thread that the row was first found for, and not of a later one of its number.
 static __always_inline struct ThreadRow *Find(const struct task_struct *task) {
     __u32 tid = (__u32)task->pid;
+    if ((shared.filter[tid / 64 % FILTER_WORDS] >> tid % 64 & 1) == 0) {
+        return 0;
+    }
     struct ThreadRow *row = bpf_map_lookup_elem(&threads, &tid);
-    if (row != 0 && row->born != task->start_boottime) {
-        if (row->born != 0) {
-            return 0;  // a later thread of this number
-        }
+    if (row != 0 && row->task == 0) {
+        row->task = (__u64)task;
         row->born = task->start_boottime;
     }
-    return row;
+    return row != 0 && row->task == (__u64)task ? row : 0;
 }
 
 // Ends a period and begins the next. The first one begins at an unknown time.
@@ -33,7 +37,7 @@ static __always_inline void Step(struct ThreadRow *row, __u32 state) {
     if (period < PERIODS) {
         __u64 length = now - row->since;
         row->periods[period].sum += length;
-        __u32 bucket = BucketOf(PERIOD_LIMITS, length);
+        __u32 bucket = BucketOf(shared.limits[0], length);
         if (bucket < BUCKETS) {
             row->periods[period].buckets[bucket]++;
         }

@@ -22,7 +22,6 @@ Outcome Watch(Tracking *tracking, TrackingGroup group, std::unordered_set<u32> *
         watched->insert(tid);
         return FINE;
     }
-    CloseUnused(tracking, group, *watched);
     return error == -E2BIG ? Fail(tracking, BROKEN, std::to_string(THREADS_MOST) + " threads are the most")
                            : FailWith(tracking, error, "threads");
 }
@@ -55,8 +54,18 @@ int FillCaches(Tracking *tracking) {
 }  // namespace
 
 Outcome RunWatch(Tracking *tracking, u32 tid) {
+    if (tracking->runs.count(tid) != 0) {
+        return FINE;
+    }
     Outcome outcome = GroupNeed(tracking, TRACKING_RUNS);
-    return outcome == FINE ? Watch<ThreadRow>(tracking, TRACKING_RUNS, &tracking->runs, tid) : outcome;
+    if (outcome == FINE) {
+        outcome = Watch<ThreadRow>(tracking, TRACKING_RUNS, &tracking->runs, tid);
+    }
+    if (outcome == FINE) {
+        FilterAdmit(tracking, TRACKING_RUNS, tid, true);
+    }
+    CloseUnused(tracking, TRACKING_RUNS, tracking->runs);
+    return outcome;
 }
 
 Outcome RunRead(Tracking *tracking, u32 tid, ThreadSamples *samples) {
@@ -76,6 +85,9 @@ Outcome RunRead(Tracking *tracking, u32 tid, ThreadSamples *samples) {
 }
 
 void RunUnwatch(Tracking *tracking, u32 tid) {
+    if (tracking->runs.count(tid) != 0) {
+        FilterAdmit(tracking, TRACKING_RUNS, tid, false);
+    }
     Unwatch(tracking, TRACKING_RUNS, &tracking->runs, tid);
 }
 
@@ -86,16 +98,15 @@ Outcome MovesCaches(Tracking *tracking, const u32 *cacheOfCpu, u32 cpus) {
 }
 
 Outcome MovesWatch(Tracking *tracking, u32 tid) {
-    bool loaded = tracking->groups[TRACKING_MOVES].loaded;
     Outcome outcome = GroupNeed(tracking, TRACKING_MOVES);
-    if (outcome != FINE) {
-        return outcome;
+    if (int error = outcome == FINE && tracking->moves.empty() ? FillCaches(tracking) : 0; error != 0) {
+        outcome = FailWith(tracking, error, "moves");
     }
-    if (int error = loaded ? 0 : FillCaches(tracking); error != 0) {
-        GroupClose(tracking, TRACKING_MOVES);
-        return FailWith(tracking, error, "moves");
+    if (outcome == FINE) {
+        outcome = Watch<MoveRow>(tracking, TRACKING_MOVES, &tracking->moves, tid);
     }
-    return Watch<MoveRow>(tracking, TRACKING_MOVES, &tracking->moves, tid);
+    CloseUnused(tracking, TRACKING_MOVES, tracking->moves);
+    return outcome;
 }
 
 Outcome MovesRead(Tracking *tracking, u32 tid, u64 *moves) {
