@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cstring>
 #include <fcntl.h>
+#include <linux/capability.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -38,6 +39,13 @@ int Attach(int program) {
     bpf_attr attributes = {};
     attributes.raw_tracepoint.prog_fd = static_cast<u32>(program);
     return Bpf(BPF_RAW_TRACEPOINT_OPEN, &attributes);
+}
+
+bool Capable() {
+    __user_cap_header_struct header = {_LINUX_CAPABILITY_VERSION_3, 0};
+    __user_cap_data_struct sets[2] = {};
+    auto has = [&sets](u32 right) { return (sets[right / 32].effective >> right % 32 & 1) != 0; };
+    return syscall(SYS_capget, &header, sets) != 0 || has(CAP_SYS_ADMIN) || (has(CAP_BPF) && has(CAP_PERFMON));
 }
 
 // "0-3,8": ascending; false for anything else.
@@ -97,8 +105,7 @@ Outcome Load(Tracking *tracking, TrackingGroup group) {
         tracking->groups[group].loaded = true;
         return FINE;
     }
-    // Whoever may load knows what is missing; who may not need not know.
-    bool typeless = error != -EPERM && access("/sys/kernel/btf/vmlinux", R_OK) != 0;
+    bool typeless = error != -EPERM && Capable() && access("/sys/kernel/btf/vmlinux", F_OK) != 0;
     return typeless ? Fail(tracking, UNSUPPORTED, "the kernel has no type data in /sys/kernel/btf/vmlinux")
                     : FailWith(tracking, error, program.name);
 }
@@ -187,7 +194,7 @@ Outcome Fail(Tracking *tracking, Outcome outcome, const std::string &reason) {
 }
 
 Outcome FailWith(Tracking *tracking, int error, const char *what) {
-    if (error == -EPERM) {
+    if (error == -EPERM || !Capable()) {  // of the two rights, the kernel names only one so
         return Fail(tracking, REFUSED, "needs CAP_BPF and CAP_PERFMON outside of user namespaces");
     }
     if (error == -ENOSYS) {

@@ -121,6 +121,14 @@ struct TaskSamples {
     __u32 reserved;
 };
 
+#ifndef __cplusplus
+#define static_assert _Static_assert
+#endif
+static_assert(sizeof(struct TrackedPort) == 12 && sizeof(struct PortSlot) == 64, "");
+static_assert(sizeof(struct PortCounts) == 216 && sizeof(struct PortRow) == 440, "");
+static_assert(sizeof(struct ThreadRow) == 536 && sizeof(struct VectorRow) == 24, "");
+static_assert(sizeof(struct TaskSamples) == 72 && sizeof(struct Shared) <= 4096, "");
+
 // Without branches, which no CPU could foretell. Samples and limits lie below 2^63.
 static inline __u32 BucketOf(const __u64 limits[LIMITS], __u64 sample) {
     __u64 bucket = (limits[15] - sample) >> 63 << 4;
