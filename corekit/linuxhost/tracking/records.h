@@ -127,7 +127,7 @@ struct TaskSamples {
 static_assert(sizeof(struct TrackedPort) == 12 && sizeof(struct PortSlot) == 64, "");
 static_assert(sizeof(struct PortCounts) == 216 && sizeof(struct PortRow) == 440, "");
 static_assert(sizeof(struct ThreadRow) == 536 && sizeof(struct VectorRow) == 24, "");
-static_assert(sizeof(struct TaskSamples) == 72 && sizeof(struct Shared) <= 4096, "");
+static_assert(sizeof(struct TaskSamples) == 64 && sizeof(struct Shared) <= 4096, "");
 
 // Without branches, which no CPU could foretell. Samples and limits lie below 2^63.
 static inline __u32 BucketOf(const __u64 limits[LIMITS], __u64 sample) {
