@@ -122,7 +122,7 @@ Outcome PortStart(Tracking *tracking, const TrackedPort *port, PortFamily family
     if (outcome == FINE) {
         outcome = Watch(tracking, *port, &watched);
     }
-    if (outcome != FINE) {
+    if (watched == nullptr) {
         CloseUnused(tracking);
         return outcome;
     }

@@ -129,11 +129,22 @@ static_assert(sizeof(struct PortCounts) == 216 && sizeof(struct PortRow) == 440,
 static_assert(sizeof(struct ThreadRow) == 536 && sizeof(struct VectorRow) == 24, "");
 static_assert(sizeof(struct TaskSamples) == 64 && sizeof(struct Shared) <= 4096, "");
 
+// The kernel follows a sum within its bounds, but in 6.1 not the OR that the compiler would make of it.
+#ifdef __bpf__
+#define KEEP_SUM(number) asm volatile("" : "+r"(number))
+#else
+#define KEEP_SUM(number)
+#endif
+
 // Without branches, which no CPU could foretell. Samples and limits lie below 2^63.
 static inline __u32 BucketOf(const __u64 limits[LIMITS], __u64 sample) {
     __u64 bucket = (limits[15] - sample) >> 63 << 4;
+    KEEP_SUM(bucket);
     bucket += (limits[bucket + 7] - sample) >> 63 << 3;
+    KEEP_SUM(bucket);
     bucket += (limits[bucket + 3] - sample) >> 63 << 2;
+    KEEP_SUM(bucket);
     bucket += (limits[bucket + 1] - sample) >> 63 << 1;
+    KEEP_SUM(bucket);
     return (__u32)(bucket + ((limits[bucket] - sample) >> 63));
 }
