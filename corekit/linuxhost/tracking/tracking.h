@@ -19,8 +19,9 @@ enum TrackingGroup : u32 {
 };
 
 // Of a port. A sample is a packet as the driver and the stack hand it to each other, which is what the interface counts
-// as one: an offload packet is one sample. Of VLAN, macvlan and macvtap interfaces no received packet can be seen, so
-// don't ask for these.
+// as one: an offload packet is one sample. What comes to a VLAN, bond, team, macvlan or macvtap goes no such way and is
+// never seen, so don't ask for these. Whoever watches an index stops when its interface goes: the next one to bear it
+// would go on in the same row.
 struct PortSamples {
     u64 count;  // of all buckets
     u64 sum;    // bytes or ns
