@@ -85,7 +85,7 @@ struct PeriodCounts {
     __u64 sum;  // ns
     __u64 buckets[BUCKETS];
 };
-struct ThreadRow {
+struct PeriodRow {
     __u64 task;   // the kernel's address of it; 0 until it is seen
     __u64 born;   // ns of the boot clock when it began
     __u64 since;  // ns; when its period began

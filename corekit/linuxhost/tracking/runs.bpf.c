@@ -11,18 +11,18 @@ struct {
     __uint(map_flags, BPF_F_NO_PREALLOC);
     __uint(max_entries, THREADS_MOST);
     __type(key, __u32);
-    __type(value, struct ThreadRow);
+    __type(value, struct PeriodRow);
 } threads SEC(".maps");
 
 struct Shared shared;
 
 // Of the thread that the row was first found for, and not of a later one of its number.
-static __always_inline struct ThreadRow *Find(const struct task_struct *task) {
+static __always_inline struct PeriodRow *Find(const struct task_struct *task) {
     __u32 tid = (__u32)task->pid;
     if ((shared.filter[tid / 64 % FILTER_WORDS] >> tid % 64 & 1) == 0) {
         return 0;
     }
-    struct ThreadRow *row = bpf_map_lookup_elem(&threads, &tid);
+    struct PeriodRow *row = bpf_map_lookup_elem(&threads, &tid);
     if (row != 0 && row->task == 0) {
         row->task = (__u64)task;
         row->born = task->start_boottime;
@@ -31,7 +31,7 @@ static __always_inline struct ThreadRow *Find(const struct task_struct *task) {
 }
 
 // Ends a period and begins the next. The first one begins at an unknown time.
-static __always_inline void Step(struct ThreadRow *row, __u32 state) {
+static __always_inline void Step(struct PeriodRow *row, __u32 state) {
     __u64 now = bpf_ktime_get_ns();
     __u32 period = row->state - 1;
     if (period < PERIODS) {
@@ -50,7 +50,7 @@ static __always_inline void Step(struct ThreadRow *row, __u32 state) {
 SEC("tp_btf/sched_switch")
 int Switch(__u64 *ctx) {
     const struct task_struct *leaves = (const struct task_struct *)ctx[1];
-    struct ThreadRow *row = Find(leaves);
+    struct PeriodRow *row = Find(leaves);
     if (row != 0) {
         bool sleeps = (ctx[0] & 0xff) == 0 && leaves->__state != 0;
         Step(row, sleeps ? PERIOD_WAIT + 1 : PERIOD_READY + 1);
@@ -65,7 +65,7 @@ int Switch(__u64 *ctx) {
 // Also told of a thread that had not yet gone to sleep.
 SEC("tp_btf/sched_wakeup")
 int Wakeup(__u64 *ctx) {
-    struct ThreadRow *row = Find((const struct task_struct *)ctx[0]);
+    struct PeriodRow *row = Find((const struct task_struct *)ctx[0]);
     if (row != 0 && row->state == PERIOD_WAIT + 1) {
         Step(row, PERIOD_READY + 1);
     }

@@ -59,7 +59,7 @@ Outcome RunWatch(Tracking *tracking, u32 tid) {
     }
     Outcome outcome = GroupNeed(tracking, TRACKING_RUNS);
     if (outcome == FINE) {
-        outcome = Watch<ThreadRow>(tracking, TRACKING_RUNS, &tracking->runs, tid);
+        outcome = Watch<PeriodRow>(tracking, TRACKING_RUNS, &tracking->runs, tid);
     }
     if (outcome == FINE) {
         FilterAdmit(tracking, TRACKING_RUNS, tid, true);
@@ -69,7 +69,7 @@ Outcome RunWatch(Tracking *tracking, u32 tid) {
 }
 
 Outcome RunRead(Tracking *tracking, u32 tid, ThreadSamples *samples) {
-    ThreadRow row = {};
+    PeriodRow row = {};
     Outcome outcome = Read(tracking, TRACKING_RUNS, tracking->runs, tid, &row);
     *samples = {};
     samples->born = row.born;
