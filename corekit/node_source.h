@@ -49,9 +49,9 @@ struct NodeSource {
                      uint32_t size);
     // The build text of the kernel that the source shows, terminated.
     const char *(*signature)(void *context);
-    // Port histograms are out of its reach: a text in the input of a write is refused, which makes a caller give up
-    // ahead of its reads. A text is input of theirs alone.
-    bool withoutHistograms = false;
+    // Whether the input of a write may hold a text, as only operations of port histograms do: a caller whose text is
+    // refused gives them up ahead of its reads. Null: always.
+    bool (*takesText)(void *context) = nullptr;
 };
 
 constexpr char HOST_SIGNATURE[] = "Mar 14 2024 09:26:53";  // the build that programs are made against

@@ -23,8 +23,9 @@ KnfStatus AddParam(const char *call, KnfParamList list, KnfParamRec param) {
     }
     KnfStatus status = CheckCall({CALL_ADD, 0, nullptr, &param});
     const NodeSource *source = Lib().current;
-    if (status == STATUS_OK && source != nullptr && source->withoutHistograms && param.isText && list != nullptr &&
-        list->kind == KNF_INPUT_LIST) {
+    bool written = param.isText && list != nullptr && list->kind == KNF_INPUT_LIST;
+    if (status == STATUS_OK && written && source != nullptr && source->takesText != nullptr &&
+        !source->takesText(source->context)) {
         status = STATUS_NOT_WRITABLE;
     }
     if (status == STATUS_OK) {

@@ -74,16 +74,23 @@ Answer AskRemoteWakeups(LinuxHost *host) {
     return AskThread(host, THREAD_REMOTE_WAKEUPS);
 }
 
+Answer AskPortHistograms(LinuxHost *host) {
+    return OfOutcome(HostNetwork(host) != 0 ? HostAsk(host, TRACKING_PACKETS) : UNSUPPORTED);
+}
+
+Answer AskVcpuHistograms(LinuxHost *host) {
+    return OfOutcome(HostAsk(host, TRACKING_RUNS));
+}
+
+Answer AskInterrupts(LinuxHost *host) {
+    return OfOutcome(HostAsk(host, TRACKING_VECTORS));
+}
+
 // CPUs that are off tell of no cache.
-Answer AskOneCache(LinuxHost *host) {
+Answer AskCacheMoves(LinuxHost *host) {
     const CpuTopology *topology = HostTopology(host);
-    u32 first = NO_CPU;
-    bool one = true;
-    for (u32 cache : topology != nullptr ? topology->lastCache : std::vector<u32>()) {
-        one = one && (cache == NO_CPU || first == NO_CPU || cache == first);
-        first = cache != NO_CPU ? cache : first;
-    }
-    return first == NO_CPU ? ANSWER_CANT_TELL : one ? ANSWER_YES : ANSWER_NO;
+    u32 caches = topology != nullptr ? topology->lastCaches : 0;
+    return caches == 0 ? ANSWER_CANT_TELL : caches == 1 ? ANSWER_YES : OfOutcome(HostAsk(host, TRACKING_MOVES));
 }
 
 Answer AskLinkCounters(LinuxHost *host) {
@@ -111,6 +118,10 @@ Answer AskIpv6(LinuxHost *host) {
     return OpenStack(host) && StackKnows(host->stack.row, IP6_IN) ? ANSWER_YES : ANSWER_NO;
 }
 
+// One for all that is counted on demand, as only an attempt tells what is missing.
+constexpr char TRACKING_CURE[] =
+    "root, or CAP_BPF and CAP_PERFMON; libbpf and libelf; a kernel with type data (CONFIG_DEBUG_INFO_BTF)";
+
 // clang-format off
 constexpr Feature TABLE[] = {
     {"processes of other users", "", AskProcesses,
@@ -134,9 +145,9 @@ constexpr Feature TABLE[] = {
     {"remote wake-ups", "", AskRemoteWakeups,
      "0, which nobody measured",
      "sysctl kernel.sched_schedstats=1, on a kernel with CONFIG_SCHEDSTATS"},
-    {"one last-level cache", "", AskOneCache,
-     "migrations between caches only of vcpus that are bound inside one",
-     "vcpus bound to the CPUs of one last-level cache"},
+    {"migrations between caches", "6.1", AskCacheMoves,
+     "0, which nobody measured, unless all CPUs share a last-level cache or the vcpu is bound inside one",
+     TRACKING_CURE},
     {"link counters alone", "4.7", AskLinkCounters,
      "no counters of interfaces, and so no port that can be watched",
      "a newer kernel"},
@@ -162,6 +173,15 @@ constexpr Feature TABLE[] = {
     {"IPv6 counters", "", AskIpv6,
      "0",
      "IPv6"},
+    {"histograms of ports", "6.1", AskPortHistograms,
+     "no histograms of ports, which each that asks for them says",
+     TRACKING_CURE},
+    {"histograms of vcpus", "6.1", AskVcpuHistograms,
+     "no histograms of vcpus, which is said once",
+     TRACKING_CURE},
+    {"time of interrupts", "6.1", AskInterrupts,
+     "no interrupts",
+     TRACKING_CURE},
 };
 // clang-format on
 static_assert(sizeof TABLE / sizeof *TABLE == FEATURES);

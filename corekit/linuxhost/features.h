@@ -20,7 +20,7 @@ enum FeatureId : u32 {
     FEATURE_MIGRATIONS,      // migrations of threads are told, in text or by an event
     FEATURE_PERF,            // a perf event counts migrations of others' threads
     FEATURE_REMOTE_WAKEUPS,  // kernel.sched_schedstats is on
-    FEATURE_ONE_CACHE,       // all CPUs share one last-level cache
+    FEATURE_CACHE_MOVES,     // one last-level cache, or migrations between them are counted
     FEATURE_LINK_COUNTERS,   // RTM_GETSTATS
     FEATURE_WIRE_PACKETS,    // of each NIC: it counts packets of the wire; so are the next ones of each NIC
     FEATURE_QUEUES,          // its queues are told
@@ -29,6 +29,9 @@ enum FeatureId : u32 {
     FEATURE_QUEUE_STOPS,     // and how often it was stopped
     FEATURE_TCP_SOCKETS,     // sock_diag of TCP, with notices of destroyed sockets
     FEATURE_IPV6,            // counters of IPv6
+    FEATURE_PORT_HISTOS,     // histograms of ports, which the kernel counts while somebody asks; so are the next ones
+    FEATURE_VCPU_HISTOS,     // of vcpus
+    FEATURE_INTERRUPTS,      // the time that interrupts take
     FEATURES
 };
 

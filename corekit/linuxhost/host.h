@@ -14,10 +14,9 @@
 #include "corekit/nodes.h"
 
 #include <cstring>
-#include <unordered_map>
-#include <unordered_set>
 
 constexpr u64 NOTICE_LOOK = 5000000;  // ns between two looks for changed interfaces
+constexpr u64 NANOSECONDS = 1000;     // of a microsecond
 
 // The switch of interfaces that are on none. No interface can bear this name, and it is one word of a file.
 constexpr char NO_SWITCH[] = "no/switch";
@@ -83,12 +82,16 @@ struct LinuxHost {
     ThreadUse *use = nullptr;                               // the last one
     std::unordered_map<std::string, WorkerThread> workers;  // by the name of the worldlet
 
+    OnDemand demand{};
+
     bool toldNetlink = false;  // what was said once
     bool toldQueues = false;
     bool toldSockets = false;
     bool toldCpus = false;
     bool toldCrowd = false;
     bool toldTap = false;
+    bool toldRefusal = false;
+    bool toldBlind = false;
 };
 
 // Writing records, which are all zeros before.
@@ -137,8 +140,28 @@ void HostMarkOne(LinuxHost *host, Link *link);
 // another index or address, nothing is believed.
 void HostFindParents(LinuxHost *host);
 
-// host_counters.cpp. The running counters of an interface, of a generation that `served` was not served from before.
+// host_counters.cpp. What a port's client sent is what its interface received.
+bool HostSeenFromOutside(const Link &link);
+// The running counters of an interface, of a generation that `served` was not served from before.
 Outcome HostCounters(LinuxHost *host, u32 index, u32 Port::*served, const LinkCounters **counters);
 
 // host_cpus.cpp. Null when the CPUs can't be told.
 const CpuTopology *HostTopology(LinuxHost *host);
+
+// host_demand.cpp. The part that counts on demand, opened by the first call; null when it can't be.
+const TrackingTable *HostTracking(LinuxHost *host);
+void HostTrackingClose(LinuxHost *host);
+// Whether it can count something, which takes about as long as to begin with it.
+Outcome HostAsk(LinuxHost *host, TrackingGroup group);
+// Says once why the kernel does not count what the user has asked for.
+void HostTellRefusal(LinuxHost *host, const char *what);
+// The inode of our network namespace; 0 when it is not told.
+u32 HostNetwork(LinuxHost *host);
+// Migrations of a vcpu between last-level caches; 0 where there is one, the vcpu is bound inside one, or nobody counts.
+u64 HostCacheMoves(LinuxHost *host, u32 tid);
+
+// host_histograms.cpp. Whether ports can have histograms, asked once.
+bool HostTakesHistograms(LinuxHost *host);
+
+// host_vectors.cpp. The interrupt vectors of NICs, with their names as a reader looks for them.
+std::map<u32, Params> HostVectors(LinuxHost *host);

@@ -72,11 +72,6 @@ Outcome FillCounters(LinuxHost *host, u32 index, Port *port) {
     return outcome;
 }
 
-// What a port's client sent is what a tap or a veth received.
-bool SeenFromOutside(const Link &link) {
-    return link.kind == KIND_TAP || link.kind == KIND_VETH;
-}
-
 void PutDirections(const LinkCounters &counters, bool swapped, char *record) {
     using namespace port_stats;
     u64 sentLost = counters.txDropped + counters.txErrors;
@@ -219,6 +214,10 @@ std::string DeviceText(const LinuxHost &host, const Link &link) {
 
 }  // namespace
 
+bool HostSeenFromOutside(const Link &link) {
+    return link.kind == KIND_TAP || link.kind == KIND_VETH;
+}
+
 Outcome HostCounters(LinuxHost *host, u32 index, u32 Port::*served, const LinkCounters **counters) {
     Port *port = HostPortOf(host, index);
     if (PassJoin(&host->counting, &(port->*served), host->clock)) {
@@ -240,7 +239,7 @@ KnfStatus PortStatsGet(LinuxHost *host, const Params &keys, char *record) {
         return STATUS_NOT_FOUND;
     }
     if (outcome == FINE) {
-        PutDirections(*counters, SeenFromOutside(*link), record);
+        PutDirections(*counters, HostSeenFromOutside(*link), record);
     }
     return StatusOf(outcome);
 }

@@ -45,3 +45,22 @@ KnfStatus Ipv4Get(LinuxHost *host, const Params &keys, char *record);
 KnfStatus Ipv6Get(LinuxHost *host, const Params &keys, char *record);
 KnfStatus TcpGet(LinuxHost *host, const Params &keys, char *record);
 KnfStatus UdpGet(LinuxHost *host, const Params &keys, char *record);
+
+// host_histograms.cpp: histograms of ports. A write's input may be anything.
+KnfStatus ClustersSet(LinuxHost *host, const Params &keys, const Params &input);
+KnfStatus SizesSet(LinuxHost *host, const Params &keys, const Params &input);
+KnfStatus IntervalsSet(LinuxHost *host, const Params &keys, const Params &input);
+KnfStatus ClustersGet(LinuxHost *host, const Params &keys, char *record);
+KnfStatus SizesInGet(LinuxHost *host, const Params &keys, char *record);
+KnfStatus SizesOutGet(LinuxHost *host, const Params &keys, char *record);
+KnfStatus IntervalsInGet(LinuxHost *host, const Params &keys, char *record);
+KnfStatus IntervalsOutGet(LinuxHost *host, const Params &keys, char *record);
+
+// host_demand.cpp: histograms of vcpus.
+KnfStatus OptionSet(LinuxHost *host, const Params &keys, const Params &input);
+KnfStatus VcpuHistoGet(LinuxHost *host, const Params &keys, char *record);
+
+// host_vectors.cpp: interrupts of NICs.
+KnfStatus VectorList(LinuxHost *host, const Params &keys, Params *entries);
+KnfStatus VectorNames(LinuxHost *host, const Params &keys, Params *entries);
+KnfStatus VectorStatsGet(LinuxHost *host, const Params &keys, char *record);

@@ -9,7 +9,6 @@ namespace {
 // Which node of a thread is read: each is an instance of its own.
 enum ThreadNode : u8 { THREAD_STATES, THREAD_EVENTS, THREAD_MOVES, THREAD_CACHE_MOVES };
 
-constexpr u64 NANOSECONDS = 1000;  // of a microsecond
 constexpr u32 NO_WORLDLET = 0xffffffff;
 
 Threads *OpenThreads(LinuxHost *host) {
@@ -165,10 +164,16 @@ KnfStatus VcpuMigrationsGet(LinuxHost *host, const Params &keys, char *record) {
     return StatusOf(outcome);
 }
 
-// True where there is one last-level cache, or the thread may not leave its own; elsewhere nobody counts.
-KnfStatus VcpuCacheMigrationsGet(LinuxHost *host, const Params &keys, char * /*record*/) {
+KnfStatus VcpuCacheMigrationsGet(LinuxHost *host, const Params &keys, char *record) {
     const ThreadRow *row = nullptr;
-    return keys[1].text == "L3" ? StatusOf(ReadVcpu(host, keys[0].number, THREAD_CACHE_MOVES, &row)) : STATUS_NOT_FOUND;
+    if (keys[1].text != "L3") {
+        return STATUS_NOT_FOUND;
+    }
+    Outcome outcome = ReadVcpu(host, keys[0].number, THREAD_CACHE_MOVES, &row);
+    if (outcome == FINE && !IsSelf(host, keys[0].number)) {
+        Put(record, vcpu_migrations::COUNT, HostCacheMoves(host, static_cast<u32>(keys[0].number)));
+    }
+    return StatusOf(outcome);
 }
 
 KnfStatus WorldletList(LinuxHost *host, const Params & /*keys*/, Params *entries) {

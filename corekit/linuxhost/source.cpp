@@ -20,14 +20,14 @@ struct ListRow {
     KnfStatus (*list)(LinuxHost *host, const Params &keys, Params *entries);
 };
 
-// The kernel counts interrupts but not the time that they take. A host without vectors is one that a caller does
-// without in silence; a vector without its time would be half a truth.
-KnfStatus NoVectors(LinuxHost * /*host*/, const Params & /*keys*/, Params * /*entries*/) {
-    return STATUS_OK;
-}
+struct SetRow {
+    u32 node;
+    const char *keys;
+    KnfStatus (*set)(LinuxHost *host, const Params &keys, const Params &input);
+};
 
 // The nodes that a Linux host has. All others fail, which is how a caller learns to do without: models of virtual NICs
-// and their coalescing, and histograms.
+// and their coalescing.
 // clang-format off
 constexpr GetRow GETS[] = {
     {NODE_PORT_STATUS, "si", PortStatusGet}, {NODE_PORT_STATS, "si", PortStatsGet},
@@ -39,10 +39,17 @@ constexpr GetRow GETS[] = {
     {NODE_UDP, "", UdpGet}, {NODE_PORT_TYPE, "i", PortTypeGet}, {NODE_NIC_PROPERTIES, "s", NicPropertiesGet},
     {NODE_TOPOLOGY, "", TopologyGet}, {NODE_PCPU_INFO, "i", PcpuInfoGet}, {NODE_CONFIG_OPTION, "ss", OptionGet},
     {NODE_WORLD_CARTEL, "i", CartelGet}, {NODE_CARTEL_GROUP, "i", GroupGet}, {NODE_GROUP_LEADER, "i", LeaderGet},
-    {NODE_TIME, "", TimeGet}};
+    {NODE_TIME, "", TimeGet}, {NODE_VECTOR_STATS, "ii", VectorStatsGet}, {NODE_SIZES_IN, "si", SizesInGet},
+    {NODE_SIZES_OUT, "si", SizesOutGet}, {NODE_CLUSTERS_IN, "si", ClustersGet},
+    {NODE_CLUSTERS_OUT, "si", ClustersGet}, {NODE_INTERVALS_IN, "si", IntervalsInGet},
+    {NODE_INTERVALS_OUT, "si", IntervalsOutGet}, {NODE_VCPU_HISTO, "is", VcpuHistoGet}};
 constexpr ListRow LISTS[] = {
     {NODE_SWITCH_LIST, "", SwitchList}, {NODE_SWITCH_PORTS, "s", SwitchPorts}, {NODE_VCPU_LIST, "i", VcpuList},
-    {NODE_WORLDLET_LIST, "", WorldletList}, {NODE_RXQ_FILTERS, "si", RxqFilters}, {NODE_VECTOR_LIST, "", NoVectors}};
+    {NODE_WORLDLET_LIST, "", WorldletList}, {NODE_RXQ_FILTERS, "si", RxqFilters}, {NODE_VECTOR_LIST, "", VectorList},
+    {NODE_VECTOR_NAMES, "i", VectorNames}};
+constexpr SetRow SETS[] = {
+    {NODE_CLUSTERS, "si", ClustersSet}, {NODE_SIZES, "si", SizesSet}, {NODE_INTERVALS, "si", IntervalsSet},
+    {NODE_CONFIG_OPTION_SET, "ss", OptionSet}};
 // clang-format on
 
 bool Fit(const Params &keys, const char *kinds) {
@@ -73,6 +80,22 @@ KnfStatus List(void *context, u32 node, const Params &keys, Params *entries) {
         }
     }
     return STATUS_NOT_FOUND;
+}
+
+KnfStatus Set(void *context, u32 node, const Params &keys, const Params &input, void *result, u32 size) {
+    for (const SetRow &row : SETS) {
+        if (row.node == node && Fit(keys, row.keys)) {
+            if (result != nullptr) {
+                memset(result, 0, size);
+            }
+            return row.set(static_cast<LinuxHost *>(context), keys, input);
+        }
+    }
+    return STATUS_NOT_WRITABLE;
+}
+
+bool TakesText(void *context) {
+    return HostTakesHistograms(static_cast<LinuxHost *>(context));
 }
 
 const char *Signature(void * /*context*/) {
@@ -106,6 +129,7 @@ LinuxHost *LinuxHostOpen() {
 
 void LinuxHostClose(LinuxHost *host) {
     if (host != nullptr) {
+        HostTrackingClose(host);
         ThreadsClose(&host->threads);
         CpusClose(&host->cpus);
         StackClose(&host->stack);
@@ -115,5 +139,5 @@ void LinuxHostClose(LinuxHost *host) {
 }
 
 NodeSource LinuxHostSource(LinuxHost *host) {
-    return {host, Get, List, nullptr, Signature, true};
+    return {host, Get, List, Set, Signature, TakesText};
 }

@@ -71,7 +71,10 @@ const KeyRow KEY_ROWS[] = {
     {"ports.rxqueue.active", ZERO, "no filters"},
     {"ports.rxqueue.filters", ZERO, "no filters"},
     {"ports.rxqueue.ports", ZERO, "no filters"},
-    {"ports.intr.*", ABSENT, "the kernel counts interrupts but not their time, and half of the section would be made up"},
+    {"ports.intr.count", EXACT, "interrupts of the NIC's vectors; those of a device with several NICs are told apart by the "
+     "names of their handlers, if they can be", FEATURE_INTERRUPTS, ABSENT},
+    {"ports.intr.used", EXACT, "time in their handlers; what those leave to softirqs is in \"wdt\" of the CPUs",
+     FEATURE_INTERRUPTS, ABSENT},
     {"ports.ipv4.txpps", EXACT, STACK},
     {"ports.ipv4.txeps", EXACT, "OutDiscards and OutNoRoutes"},
     {"ports.ipv4.txfrags", EXACT, STACK},
@@ -124,9 +127,12 @@ const KeyRow KEY_ROWS[] = {
     {"ports.vcpu.cstp", ZERO, "Linux schedules each vcpu for itself"},
     {"ports.vcpu.actnot", UNMEASURED, "an event of another kernel"},
     {"ports.vcpu.migtot", EXACT, "migrations of the thread", FEATURE_MIGRATIONS},
-    {"ports.vcpu.migl3", ZERO, "one last-level cache, or a vcpu bound inside one: it can't leave it", FEATURE_ONE_CACHE},
-    {"ports.vcpu.histos.*", ABSENT, "the kernel keeps none"},
-    {"ports.histos.*", ABSENT, "the kernel keeps none"},
+    {"ports.vcpu.migl3", EXACT, "migrations between last-level caches; none where there is but one",
+     FEATURE_CACHE_MOVES},
+    {"ports.vcpu.histos.*", EXACT, "by the scheduler's switches of the thread; no periods of \"cstp\", as Linux schedules "
+     "each vcpu for itself", FEATURE_VCPU_HISTOS, ABSENT},
+    {"ports.histos.*", CLOSE, "bytes and microseconds of packets as they are handed over, input from the port's client; "
+     "Linux has no clusters: no samples of them", FEATURE_PORT_HISTOS, ABSENT},
     {"overhead.used", EXACT, "clock of the process"},
 };
 // clang-format on

@@ -102,6 +102,7 @@ void ReadTopology(Reader *reader, CpuTopology *topology) {
                     topology->lastCache[other] = cpu;
                 }
             });
+            topology->lastCaches++;
             topology->lastCacheSharers = topology->lastCacheSharers == 0 ? count : topology->lastCacheSharers;
         }
     }
