@@ -289,6 +289,7 @@ void FeaturesAsk(LinuxHost *host, HostTold *told) {
             TellPort(host, link, told);
         }
     }
+    told->vectors = static_cast<u32>(HostVectors(host).size());
     for (u32 id = FEATURE_WIRE_PACKETS; id <= FEATURE_QUEUE_STOPS && !told->nics.empty(); id++) {
         bool all = std::all_of(told->nics.begin(), told->nics.end(), [id](const NicTold &nic) {
             return NicServed(nic, static_cast<FeatureId>(id)) == SERVED;

@@ -63,6 +63,7 @@ struct HostTold {
     std::vector<NicTold> nics;
     u32 ports;      // that are not hidden
     u32 stacks;     // ports of the host's IP stack
+    u32 vectors;    // interrupt vectors of NICs
     u32 worldlets;  // threads that serve a NIC, a port of the IP stack or a guest with vcpus
 };
 

@@ -186,15 +186,18 @@ const char *NoneNow(const HostTold &host, const std::string &section) {
     if (isOne({"ports.ipv4", "ports.ipv6", "ports.tcptx", "ports.tcprx", "ports.udp"})) {
         return host.stacks == 0 ? "no bridge with an address whose counters of the IP stack can be read" : nullptr;
     }
+    if (section == "ports.intr") {
+        return host.vectors == 0 ? "no NIC with interrupt vectors of its own" : nullptr;
+    }
     if (section == "ports.wdt") {
         return host.worldlets == 0 ? "no thread of a NIC, no vhost worker of a guest with vcpus" : nullptr;
     }
-    if (section == "ports.vcpu") {
+    if (isOne({"ports.vcpu", "ports.vcpu.histos"})) {
         bool any = std::any_of(host.guests.guests.begin(), host.guests.guests.end(),
                                [](const Guest &guest) { return !guest.vcpus.empty(); });
         return any ? nullptr : "no guest with vcpus that this user may look at";
     }
-    return section == "ports" && host.ports == 0 ? "no interface but the hidden one" : nullptr;
+    return isOne({"ports", "ports.histos"}) && host.ports == 0 ? "no interface but the hidden one" : nullptr;
 }
 
 // The key without its section.
