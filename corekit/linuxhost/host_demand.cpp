@@ -20,6 +20,9 @@ Outcome ReadPeriods(LinuxHost *host, u32 tid, u32 period, const ThreadSamples **
         demand->vcpus.erase(found);
         return outcome;
     }
+    if (added) {
+        demand->table->threadUnwatch(demand->tracking, NO_THREAD);
+    }
     VcpuPeriods *vcpu = &found->second;
     if (PassJoin(&vcpu->pass, &vcpu->served[period], host->now())) {
         outcome = demand->table->threadRead(demand->tracking, tid, &vcpu->samples);
@@ -40,18 +43,20 @@ void PutPeriods(const PeriodSamples &samples, char *record) {
 
 KnfStatus TrackPeriods(LinuxHost *host, bool on) {
     OnDemand *demand = &host->demand;
+    Outcome outcome = FINE;
     if (on && !demand->periods) {
-        if (Outcome outcome = HostAsk(host, TRACKING_RUNS); outcome != FINE) {
-            HostTellRefusal(host, "histograms of vcpus");
-            return StatusOf(outcome);
-        }
+        const TrackingTable *table = HostTracking(host);
+        outcome = table != nullptr ? table->threadWatch(demand->tracking, NO_THREAD) : UNSUPPORTED;
     }
-    for (const auto &[tid, vcpu] : demand->vcpus) {
-        if (!on) {
+    if (outcome != FINE) {
+        HostTellRefusal(host, "histograms of vcpus");
+        return StatusOf(outcome);
+    }
+    if (!on && demand->periods) {
+        demand->vcpus.try_emplace(NO_THREAD);
+        for (const auto &[tid, vcpu] : demand->vcpus) {
             demand->table->threadUnwatch(demand->tracking, tid);
         }
-    }
-    if (!on) {
         demand->vcpus.clear();
     }
     demand->periods = on;

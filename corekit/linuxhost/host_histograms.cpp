@@ -96,6 +96,9 @@ KnfStatus Start(LinuxHost *host, PortFamily family, PortHistogram *histogram) {
     histogram->running = outcome == FINE;
     if (outcome != FINE) {
         HostTellRefusal(host, "histograms of ports");
+    } else if (histogram->port.index != NO_INTERFACE) {
+        TrackedPort nobody = {histogram->port.netns, NO_INTERFACE, PORT_SENDS};
+        table->portStop(host->demand.tracking, &nobody, PORT_SIZES);
     }
     return StatusOf(outcome);
 }
@@ -169,10 +172,8 @@ bool HostTakesHistograms(LinuxHost *host) {
     OnDemand *demand = &host->demand;
     if (!demand->asked) {
         demand->asked = true;
-        demand->histograms = HostNetwork(host) != 0 && HostAsk(host, TRACKING_PACKETS) == FINE;
-        if (!demand->histograms) {
-            HostTellRefusal(host, "histograms of ports");
-        }
+        PortHistogram nobody = {{HostNetwork(host), NO_INTERFACE, PORT_SENDS}};
+        demand->histograms = Start(host, PORT_SIZES, &nobody) == STATUS_OK;
     }
     return demand->histograms;
 }

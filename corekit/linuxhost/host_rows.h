@@ -99,6 +99,18 @@ struct VcpuPeriods {
     ThreadSamples samples{};
 };
 
+// An interrupt vector of a NIC. Each CPU is an instance of its node; one look serves them all.
+struct Vector {
+    Params names;
+    u32 generation = 0;
+    std::vector<u32> served;             // by CPU
+    std::vector<VectorSamples> samples;  // the same
+};
+
+// Watched only to hold the programs from the question whether they can be had to their first use.
+constexpr u32 NO_INTERFACE = 0;
+constexpr u32 NO_THREAD = 0xffffffff;
+
 // What the kernel counts on demand.
 struct OnDemand {
     bool opened = false;                            // or tried to
@@ -111,7 +123,9 @@ struct OnDemand {
     std::unordered_map<u32, PortHistograms> ports;  // by index; none ever leaves
     bool periods = false;                           // of vcpus are counted
     std::unordered_map<u32, VcpuPeriods> vcpus;     // by thread, those that were read since
-    std::map<u32, Params> vectors;                  // those that were listed, with their names
-    std::unordered_set<u32> movers;                 // threads whose migrations between caches are counted
+    std::map<u32, Vector> vectors;                  // those that were listed
+    Pass vectorPass{};
+    bool vectorsRefused = false;
+    std::unordered_set<u32> movers;  // threads whose migrations between caches are counted
     bool movesRefused = false;
 };

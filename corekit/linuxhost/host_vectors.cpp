@@ -64,6 +64,13 @@ Params NamesOf(std::vector<Owner> owners, const Names &actions, const Names &nic
     return names;
 }
 
+// Null unless it was listed.
+Vector *VectorOf(LinuxHost *host, int64_t number) {
+    auto &vectors = host->demand.vectors;
+    auto found = number > 0 && number <= INT32_MAX ? vectors.find(static_cast<u32>(number)) : vectors.end();
+    return found != vectors.end() ? &found->second : nullptr;
+}
+
 }  // namespace
 
 std::map<u32, Params> HostVectors(LinuxHost *host) {
@@ -79,38 +86,50 @@ std::map<u32, Params> HostVectors(LinuxHost *host) {
 
 KnfStatus VectorList(LinuxHost *host, const Params & /*keys*/, Params *entries) {
     OnDemand *demand = &host->demand;
-    for (auto &[vector, names] : HostVectors(host)) {
+    if (demand->vectorsRefused) {
+        return STATUS_OK;
+    }
+    for (auto &[number, names] : HostVectors(host)) {
         const TrackingTable *table = HostTracking(host);
-        if (table == nullptr || table->vectorWatch(demand->tracking, vector) != FINE) {
-            continue;
+        Outcome outcome = table != nullptr ? table->vectorWatch(demand->tracking, number) : UNSUPPORTED;
+        if (outcome == FINE) {
+            demand->vectors[number].names = names;
+            entries->push_back(ParamOf(int64_t{number}));
         }
-        demand->vectors[vector] = names;
-        entries->push_back(ParamOf(int64_t{vector}));
+        demand->vectorsRefused = outcome == UNSUPPORTED || outcome == REFUSED;
+        if (demand->vectorsRefused) {
+            break;
+        }
     }
     return STATUS_OK;
 }
 
 KnfStatus VectorNames(LinuxHost *host, const Params &keys, Params *entries) {
-    auto found = host->demand.vectors.find(static_cast<u32>(keys[0].number));
-    if (found == host->demand.vectors.end() || found->first != keys[0].number) {
-        return STATUS_NOT_FOUND;
+    const Vector *vector = VectorOf(host, keys[0].number);
+    if (vector != nullptr) {
+        *entries = vector->names;
     }
-    *entries = found->second;
-    return STATUS_OK;
+    return vector != nullptr ? STATUS_OK : STATUS_NOT_FOUND;
 }
 
 KnfStatus VectorStatsGet(LinuxHost *host, const Params &keys, char *record) {
-    const OnDemand &demand = host->demand;
+    OnDemand *demand = &host->demand;
     const CpuTopology *topology = HostTopology(host);
-    auto vector = static_cast<u32>(keys[0].number);
-    bool there = demand.vectors.contains(vector) && vector == keys[0].number && topology != nullptr &&
-                 keys[1].number >= 0 && keys[1].number < topology->cpus;
-    VectorSamples samples = {};
-    Outcome outcome = GONE;
-    if (there) {
-        outcome = demand.table->vectorRead(demand.tracking, vector, static_cast<u32>(keys[1].number), &samples);
+    Vector *vector = VectorOf(host, keys[0].number);
+    if (vector == nullptr || topology == nullptr || keys[1].number < 0 || keys[1].number >= topology->cpus) {
+        return STATUS_NOT_FOUND;
     }
-    Put(record, vector_stats::COUNT, samples.count);
-    Put(record, vector_stats::TIME, samples.time / NANOSECONDS);
+    auto cpu = static_cast<size_t>(keys[1].number);
+    vector->served.resize(topology->cpus);
+    vector->samples.resize(topology->cpus);
+    PassJoin(&demand->vectorPass, &vector->served[cpu], host->now());
+    Outcome outcome = FINE;
+    if (vector->generation != demand->vectorPass.generation) {
+        outcome = demand->table->vectorRead(demand->tracking, static_cast<u32>(keys[0].number), topology->cpus,
+                                            vector->samples.data());
+        vector->generation = outcome == FINE ? demand->vectorPass.generation : 0;
+    }
+    Put(record, vector_stats::COUNT, vector->samples[cpu].count);
+    Put(record, vector_stats::TIME, vector->samples[cpu].time / NANOSECONDS);
     return StatusOf(outcome);
 }

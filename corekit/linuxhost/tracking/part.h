@@ -89,5 +89,5 @@ void TasksEnd(Tracking *tracking);
 
 // vectors.cpp
 Outcome VectorWatch(Tracking *tracking, u32 irq);
-Outcome VectorRead(Tracking *tracking, u32 irq, u32 cpu, VectorSamples *samples);
+Outcome VectorRead(Tracking *tracking, u32 irq, u32 cpus, VectorSamples *samples);
 void VectorUnwatch(Tracking *tracking, u32 irq);

@@ -71,7 +71,8 @@ struct TrackingTable {
 
     // By the number in /proc/interrupts.
     Outcome (*vectorWatch)(Tracking *tracking, u32 irq);
-    Outcome (*vectorRead)(Tracking *tracking, u32 irq, u32 cpu, VectorSamples *samples);  // 0 for a CPU not there
+    // On each of so many CPUs, from the first on: one look at the kernel for all. 0 for a CPU that is not there.
+    Outcome (*vectorRead)(Tracking *tracking, u32 irq, u32 cpus, VectorSamples *samples);
     void (*vectorUnwatch)(Tracking *tracking, u32 irq);
 
     // The cache of each CPU, before the first watch; a CPU past the end, or with a cache of ~0, has none to move from.

@@ -29,20 +29,22 @@ Outcome VectorWatch(Tracking *tracking, u32 irq) {
                            : FailWith(tracking, error, "interrupts");
 }
 
-Outcome VectorRead(Tracking *tracking, u32 irq, u32 cpu, VectorSamples *samples) {
-    *samples = {};
+Outcome VectorRead(Tracking *tracking, u32 irq, u32 cpus, VectorSamples *samples) {
+    std::fill(samples, samples + cpus, VectorSamples());
     if (tracking->vectors.count(irq) == 0) {
         return Fail(tracking, GONE, "not watched");
     }
     if (int error = MapLookupCpus(tracking, Map(*tracking), &irq, sizeof(VectorRow)); error != 0) {
         return FailWith(tracking, error, "interrupts");
     }
-    auto at = std::find(tracking->cpus.begin(), tracking->cpus.end(), cpu);
-    if (at != tracking->cpus.end()) {
+    const char *place = tracking->buffer.data();
+    for (u32 cpu : tracking->cpus) {
         VectorRow row;
-        auto place = static_cast<size_t>(at - tracking->cpus.begin());
-        memcpy(&row, tracking->buffer.data() + place * sizeof row, sizeof row);
-        *samples = {row.count, row.time};
+        memcpy(&row, place, sizeof row);
+        place += sizeof row;
+        if (cpu < cpus) {
+            samples[cpu] = {row.count, row.time};
+        }
     }
     return FINE;
 }
