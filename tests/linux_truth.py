@@ -783,6 +783,138 @@ def stranger():
         check("known frames", port, way("tx", 9, 810) | {"switch": "br0", "vcpu": None, "wdt": None})
 
 
+def counting(*features):
+    """Skips a test where the kernel does not count for us."""
+    told = tool(f"{BUILD}/knf-source")
+    lacks = [name for name in features if not re.search(f"^  {name} +yes$", told, re.M)]
+    if lacks:
+        skip(f"{lacks[0]}: not for this user, or not on this kernel")
+
+
+def shares(port):
+    """Of each histogram with samples the least and largest, the mean, the count and the shares of its buckets."""
+    return {row["name"]: (row["min"], row["max"], row["mean"], row["count"], {at: part for at, part in row["values"] if part})
+            for row in port["histos"] if row["count"]}
+
+
+def histograms():
+    """Sizes and intervals of known frames, at a port that gets another name, and one whose index another one takes."""
+    counting("histograms of ports")
+    network(pairs=3, taps=1)
+    write, _ = hold("t0")
+    ip("link add m0 link p2 up type macvtap mode bridge")
+    ready("t0", "m0", *(f"v{i}" for i in range(3)))
+    settled()
+    run = Run("-A", "-t", "h", "-n", "2")
+    for count, size in (300, 100), (200, 500), (100, 1400):
+        send("p0", count, size)
+    write(50, 65)
+    for _ in range(5):
+        send("m0", 1, 300)
+        time.sleep(0.002)
+    run.go(1)
+    ip("link set v0 down; link set v0 name w0; link set w0 up; link del v1; "
+       "link add v1 index 1001 up master br0 type veth peer p1; link set p1 up")
+    ready("w0", "v1", "p1")
+    send("p0", 10, 200)
+    send("p1", 7, 300)
+    first, second = records(run.end(messages="macvtap|Log0 Status: .*port"))
+    veth, tapped, macvtapped, renamed = map(shares, (first["v0"], first["t0"], first["m0"], second["w0"]))
+    check("sizes", (veth["pktsizein"], veth["pktsizeout"]), (
+        (100, 1400, 450, 600, {128: 50.0, 512: 33.3, 1514: 16.7}), (65, 300, 86, 55, {128: 90.9, 512: 9.1})))
+    check("sizes", (tapped["pktsizein"], tapped["pktsizeout"]), (
+        (65, 65, 65, 50, {128: 100.0}), (100, 1400, 448, 605, {128: 49.6, 512: 33.9, 1514: 16.5})))
+    check("sizes", shares(first["br0"])["pktsizeout"][:2], (65, 1400))
+    check("intervals", [side[f"pktinterval{way}"][3] for side in (veth, tapped) for way in ("in", "out")], [599, 54, 49, 604])
+    assert macvtapped["pktintervalin"][0] >= 2000, macvtapped
+    check("macvtap", {name: row[3] for name, row in macvtapped.items()}, {"pktsizein": 5, "pktintervalin": 4})
+    check("ports that are left", [name in second for name in ("v0", "w0", "v1")], [False, True, False])
+    check("after a reset", (renamed["pktsizein"], renamed["pktsizeout"]),
+          ((200, 200, 200, 10, {256: 100.0}), (300, 300, 300, 7, {512: 100.0})))
+
+
+def periods():
+    """Periods of a guest's vcpus: one that sleeps between short runs, one that is busy."""
+    counting("histograms of vcpus")
+    web = web_guest("CPU 0/KVM,CPU 1/KVM")
+    clocks = "[open(f'/proc/self/task/{worker.thread.native_id}/schedstat').read().split() for worker in workers]"
+    run, before = Run("-V", "web1", "-t", "V"), web.do(clocks)
+    web.do("[workers[0].ask(sum, range(9)) for i in range(200)] + [workers[1].ask(sum, range(9000000))]")
+    after, rows = web.do(clocks), records(run.end())[0]["web1"]["vcpu"]
+    for row, old, new in zip(rows, before, after, strict=True):
+        kinds = {kind["name"]: kind for kind in row["histos"]["values"]}
+        ran, runs = (int(new[i]) - int(old[i]) for i in (0, 2))
+        print(ran, runs, {name: (kind["count"], kind["mean"]) for name, kind in kinds.items()})
+        check("schedstat", (kinds["run"]["count"], kinds["cstp"]["count"]), (runs, 0))
+        check("buckets", [sum(kind["values"]) for kind in kinds.values()], [kind["count"] for kind in kinds.values()])
+        assert -1 <= ran / 1000 / runs - kinds["run"]["mean"] <= 2, (ran, kinds)
+    assert 199 <= rows[0]["histos"]["values"][3]["count"] <= rows[0]["histos"]["values"][1]["count"]
+
+
+def refused():
+    """Histograms and interrupts for root of a user namespace, who may not count."""
+    network(pairs=1)
+    run = Run("-p", "1000", "-t", "hiV", "-n", "2")
+    send("p0", 6, 100)
+    run.go(1)
+    send("p0", 4, 100)
+    ports = records(run.end(messages="histograms of ports can't be counted: needs CAP_BPF|op start failed in stage start"))
+    check("messages", len(read(run.err).splitlines()), 2)
+    for port, count in zip(ports, (6, 4), strict=True):
+        check("known frames", port["v0"], way("tx", count, count * 100) | {"histos": None, "intr": None})
+
+
+def held(pid):
+    """The programs and links that a process holds in the kernel."""
+    told = "".join(read(path) for path in pathlib.Path(f"/proc/{pid}/fdinfo").iterdir())
+    return set(re.findall(r"^(prog|link)_id:\t(\d+)$", told, re.M))
+
+
+def ends():
+    """Whatever ends a run takes along what it had in the kernel."""
+    counting("histograms of ports", "histograms of vcpus")
+    if not shutil.which("bpftool"):
+        skip("no bpftool")
+    web_guest("CPU 0/KVM")
+    for how, status in (signal.SIGCONT, 0), (signal.SIGTERM, 1), (signal.SIGKILL, -9):
+        run = Run("-A", "-t", "hV")
+        mine = held(run.process.pid)
+        check("held", {kind for kind, _ in mine}, {"prog", "link"})
+        run.process.send_signal(how)
+        run.end(status)
+        until(lambda: not mine & {(kind, str(row["id"])) for kind in ("prog", "link")
+                                  for row in json.loads(tool("bpftool", "-j", kind, "show"))})
+
+
+def came(name):
+    """Interrupts of a NIC's device, as /proc counts them."""
+    device = pathlib.Path(f"/sys/class/net/{name}/device").resolve()
+    vectors = {path.name for place in (device, device.parent) for path in place.glob("msi_irqs/*")}
+    rows = re.findall(r"^ *(\d+):((?: +\d+)+) ", read("/proc/interrupts"), re.M)
+    return sum(sum(map(int, counts.split())) for number, counts in rows if number in vectors)
+
+
+def interrupts():
+    """Interrupts of the NICs of this machine, live and by snapshots."""
+    counting("time of interrupts")
+    nics = {name: row[3] for name, row in listing().items() if row[0] == 4 and came(name)}
+    if not nics:
+        skip("no NIC with interrupts of its own")
+    for name, number in nics.items():
+        outer, run = came(name), Run("-p", str(number), "-t", "vi")
+        recorder = Run("-o", "snap", "-n", "2", program="knf-record")
+        inner = came(name)
+        time.sleep(1)
+        inner = came(name) - inner
+        live = records(run.end())[0][name]["intr"]
+        recorder.end()
+        outer = came(name) - outer
+        replayed = records(once("-a", "-c", "snap.0:snap.1", "-p", str(number), "-t", "vi"))[0][name]["intr"]
+        print(name, inner, outer, live, replayed)
+        for told in live, replayed:
+            assert inner <= told["count"] <= outer and (told["used"] > 0) >= (inner > 1000), (inner, told, outer)
+
+
 def look():
     """What other tools tell: counters by name, CPU times in us, columns of /proc/net/dev by interface and number."""
     told = nstat()
@@ -810,7 +942,8 @@ def host():
 
 
 # How a test gets its namespaces: the first way that this user may go.
-WAYS = {"host": [""], "nic": [""], "no_proc": ["-Urnm", "-nm"], "storm": ["-Urnm", "-nm"], "stranger": ["-nmpf"],
+WAYS = {"histograms": ["-n", "-Urn"], "periods": ["-n", "-Urn"], "ends": ["-n", "-Urn"], "interrupts": [""],
+        "host": [""], "nic": [""], "no_proc": ["-Urnm", "-nm"], "storm": ["-Urnm", "-nm"], "stranger": ["-nmpf"],
         "macvtap": ["-nm"]}
 
 
