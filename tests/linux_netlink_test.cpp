@@ -15,8 +15,10 @@
 #include <linux/if_link.h>
 #include <linux/pkt_sched.h>
 #include <linux/rtnetlink.h>
+#include <sched.h>
 #include <sys/resource.h>
 #include <sys/socket.h>
+#include <utility>
 
 namespace {
 
@@ -339,6 +341,202 @@ TEST(LinuxNetlink, CountsThatBeginAgainAreOfAnotherInterfaceWhenNoticesWereLost)
             machine.route.answers.push_front({links, Done()});
         }
         EXPECT_EQ(machine.Get(NODE_PORT_STATS, keys) == STATUS_OK, !lost);
+    }
+}
+
+// What counts in the kernel, played: it answers with `samples`, and keeps what it was asked.
+struct Counting {
+    inline static Strings calls;
+    inline static PortSamples samples;
+    inline static Outcome outcome = FINE;
+    static std::string Text(const TrackedPort *port, PortFamily family) {
+        return std::to_string(port->index) + (port->direction == PORT_SENDS ? " sends " : " receives ") +
+               (family == PORT_SIZES ? "sizes" : "intervals");
+    }
+    static TrackingTable Table() {
+        calls.clear();
+        outcome = FINE;
+        TrackingTable table = {};
+        table.close = [](Tracking *) {};
+        table.reason = [](const Tracking *) { return "played"; };
+        table.portStart = [](Tracking *, const TrackedPort *port, PortFamily family) {
+            return calls.push_back("start " + Text(port, family)), outcome;
+        };
+        table.portStop = [](Tracking *, const TrackedPort *port, PortFamily family) {
+            calls.push_back("stop " + Text(port, family));
+        };
+        table.portRead = [](Tracking *, const TrackedPort *, PortFamily, PortSamples *told) {
+            return *told = samples, FINE;
+        };
+        table.vectorWatch = [](Tracking *, u32 irq) {
+            return calls.push_back("watch " + std::to_string(irq)), outcome;
+        };
+        table.vectorRead = [](Tracking *, u32 irq, u32 cpus, VectorSamples *told) {
+            for (u32 cpu = 0; cpu < cpus; cpu++) {
+                told[cpu] = {10 * irq + cpu + calls.size(), 1000000 * irq};
+            }
+            return calls.push_back("read " + std::to_string(irq)), outcome;
+        };
+        table.movesCaches = [](Tracking *, const u32 *, u32 cpus) {
+            return calls.push_back("caches " + std::to_string(cpus)), outcome;
+        };
+        table.movesWatch = [](Tracking *, u32) { return calls.push_back("moves"), outcome; };
+        table.movesRead = [](Tracking *, u32, u64 *moves) { return *moves = 7, FINE; };
+        return table;
+    }
+    static Strings Calls() { return std::exchange(calls, {}); }
+};
+
+TEST(LinuxDemand, AHistogramHasWhatCameSinceItsResetAndNothingOfAnotherPort) {
+    std::string port = Told(7, "v0", "veth", 2);
+    Machine machine(Told(2, "br0", "bridge") + port + Told(8, "m0", "macvtap", 2), {7, 8});
+    TrackingTable table = Counting::Table();
+    machine.host->demand.opened = true;
+    machine.host->demand.table = &table;
+    NodeSource source = LinuxHostSource(machine.host);
+    auto set = [&](u32 node, int index, const char *operation, const char *side) {
+        return source.set(source.context, node, {ParamOf(std::string("br0")), ParamOf(index)},
+                          {ParamOf(std::string(operation)), ParamOf(std::string(side))}, nullptr, 0);
+    };
+    Params keys = {ParamOf(std::string("br0")), ParamOf(7)};
+    auto shown = [&] {  // least, largest, mean, count, and the first bucket with its limit
+        std::string record;
+        std::array<u64, 6> fields = {};
+        EXPECT_EQ(machine.Get(NODE_SIZES_IN, keys, &record), STATUS_OK);
+        memcpy(fields.data(), record.data(), sizeof fields);
+        return fields;
+    };
+    EXPECT_NE(machine.Get(NODE_SIZES_IN, keys), STATUS_OK) << "never started";
+    EXPECT_NE(set(NODE_SIZES, 7, "stop", "input"), STATUS_OK);
+    ASSERT_TRUE(source.takesText(machine.host));
+    ASSERT_TRUE(source.takesText(machine.host));
+    for (const char *side : {"input", "output"}) {
+        EXPECT_EQ(set(NODE_SIZES, 7, "start", side), STATUS_OK);
+        EXPECT_EQ(set(NODE_CLUSTERS, 7, "start", side), STATUS_OK);
+        EXPECT_EQ(set(NODE_INTERVALS, 8, "start", side), STATUS_OK);
+    }
+    EXPECT_EQ(Counting::Calls(), (Strings{"start 0 sends sizes", "start 7 receives sizes", "stop 0 sends sizes",
+                                          "start 8 sends intervals", "stop 0 sends sizes", "start 7 sends sizes",
+                                          "stop 0 sends sizes"})) << "what a macvtap receives can't be seen";
+    EXPECT_EQ(set(NODE_SIZES, 7, "start", "both"), STATUS_BAD_PARAM);
+    EXPECT_EQ(set(NODE_SIZES, 7, "halt", "input"), STATUS_BAD_PARAM);
+    using Shown = std::array<u64, 6>;
+    Counting::samples = {10, 1000, 60, 140, {10}};
+    EXPECT_EQ(shown(), (Shown{60, 140, 100, 10, 10, 64}));
+    Counting::samples = {11, 1030, 30, 30, {11}};
+    EXPECT_EQ(shown(), (Shown{30, 140, 93, 11, 11, 64}));
+    Counting::samples = {13, 1230, 90, 110, {13}};
+    EXPECT_EQ(set(NODE_SIZES, 7, "reset", "input"), STATUS_OK);
+    EXPECT_EQ(shown(), (Shown{90, 110, 100, 2, 2, 64})) << "what came between read and reset is not lost";
+    Machine::clock += 2 * PASS_FLOOR;
+    Counting::samples = {20, 2000, 1, 999, {20}};
+    EXPECT_EQ(set(NODE_SIZES, 7, "reset", "input"), STATUS_OK);
+    Counting::samples = {20, 2000, 0, 0, {20}};
+    EXPECT_EQ(shown(), (Shown{0, 0, 0, 0, 0, 64})) << "a reset long after the read";
+    Counting::samples = {24, 2400, 100, 100, {24}};
+    EXPECT_EQ(set(NODE_SIZES, 7, "stop", "input"), STATUS_OK);
+    Counting::samples = {3, 150, 50, 50, {3}};
+    EXPECT_EQ(shown(), (Shown{100, 100, 100, 4, 4, 64})) << "stopped";
+    EXPECT_EQ(set(NODE_SIZES, 7, "start", "input"), STATUS_OK);
+    EXPECT_EQ(shown(), (Shown{50, 100, 78, 7, 7, 64})) << "goes on";
+    Machine::clock += NOTICE_LOOK;
+    machine.notices.waiting = {Told(7, "v0", "veth", 2, RTM_DELLINK) + port};
+    EXPECT_NE(machine.Get(NODE_SIZES_IN, keys), STATUS_OK);
+    EXPECT_NE(machine.Get(NODE_CLUSTERS_IN, keys), STATUS_OK);
+    EXPECT_EQ(machine.Get(NODE_PORT_TYPE, {ParamOf(7)}), STATUS_OK);
+    EXPECT_NE(machine.Get(NODE_SIZES_IN, keys), STATUS_OK) << "of the one before";
+    Counting::calls.clear();
+    EXPECT_EQ(set(NODE_SIZES, 7, "start", "input"), STATUS_OK);
+    EXPECT_EQ(Counting::Calls(), (Strings{"stop 7 receives sizes", "stop 7 sends sizes", "start 7 receives sizes",
+                                          "stop 0 sends sizes"}));
+    EXPECT_EQ(shown(), (Shown{50, 50, 50, 3, 3, 64}));
+    Counting::outcome = REFUSED;
+    machine.host->demand.asked = false;
+    EXPECT_FALSE(source.takesText(machine.host));
+}
+
+TEST(LinuxDemand, AVectorIsNamedAfterItsNicsAndReadOnceAPass) {
+    std::filesystem::path top = testing::TempDir() + "vectors-" + std::to_string(getpid());
+    std::filesystem::create_directories(top / "devices/pci0/virtio0");
+    std::filesystem::create_directories(top / "bus/virtio/devices");
+    std::filesystem::create_directory_symlink(top / "devices/pci0/virtio0", top / "bus/virtio/devices/virtio0");
+    for (const auto &[vector, actions] : {std::pair("30", "eth1-rx\n"), {"31", "config,eth7x\n"}, {"x", ""}}) {
+        std::filesystem::create_directories(top / "devices/pci0/msi_irqs" / vector);
+        std::filesystem::create_directories(top / "kernel/irq" / vector);
+        std::ofstream(top / "kernel/irq" / vector / "actions") << actions;
+    }
+    Machine machine(Card(4, "eth1") + Card(5, "eth7") + Card(6, "eth10"), {});
+    ProcRootClose(&machine.host->root);
+    ProcRootOpen(&machine.host->root, top.c_str(), top.c_str());
+    ASSERT_EQ(machine.Get(NODE_PORT_TYPE, {ParamOf(4)}), STATUS_OK);
+    for (Link &link : machine.host->links.rows) {
+        strcpy(link.bus, "virtio");
+    }
+    TrackingTable table = Counting::Table();
+    machine.host->demand.opened = true;
+    machine.host->demand.table = &table;
+    machine.host->cpusOpen = true;
+    machine.host->cpus.topology.cpus = 2;
+    NodeSource source = LinuxHostSource(machine.host);
+    auto list = [&](u32 node, const Params &keys) {
+        Params entries;
+        std::string text;
+        EXPECT_EQ(source.list(source.context, node, keys, &entries), STATUS_OK);
+        for (const KnfParamRec &entry : entries) {
+            text += entry.isText ? entry.text : std::to_string(entry.number) + ",";
+        }
+        return text;
+    };
+    EXPECT_EQ(list(NODE_VECTOR_LIST, {}), "30,31,");
+    EXPECT_EQ(list(NODE_VECTOR_NAMES, {ParamOf(30)}), " eth1 ");
+    EXPECT_EQ(list(NODE_VECTOR_NAMES, {ParamOf(31)}), " eth7 config");
+    EXPECT_EQ(Counting::Calls(), (Strings{"watch 30", "watch 31"}));
+    for (u64 pass : {0, 1}) {
+        for (int vector : {30, 31}) {
+            for (u64 cpu : {0, 1}) {
+                std::array<u64, 2> told = {};
+                std::string record;
+                EXPECT_EQ(machine.Get(NODE_VECTOR_STATS, {ParamOf(vector), ParamOf(i64(cpu))}, &record), STATUS_OK);
+                memcpy(told.data(), record.data(), sizeof told);
+                u64 before = 2 * pass + (vector == 31 ? 1 : 0);
+                EXPECT_EQ(told, (std::array<u64, 2>{10 * u64(vector) + cpu + before, 1000 * u64(vector)}));
+            }
+        }
+        Machine::clock += PASS_AGE;
+    }
+    EXPECT_EQ(Counting::Calls(), (Strings{"read 30", "read 31", "read 30", "read 31"}));
+    EXPECT_NE(machine.Get(NODE_VECTOR_STATS, {ParamOf(30), ParamOf(2)}), STATUS_OK);
+    EXPECT_NE(machine.Get(NODE_VECTOR_STATS, {ParamOf(30 + (i64{1} << 32)), ParamOf(0)}), STATUS_OK);
+    Counting::outcome = REFUSED;
+    EXPECT_EQ(list(NODE_VECTOR_LIST, {}) + list(NODE_VECTOR_LIST, {}), "");
+    EXPECT_EQ(Counting::Calls(), (Strings{"watch 30"})) << "asked once";
+    std::filesystem::remove_all(top);
+}
+
+TEST(LinuxDemand, MovesBetweenCachesAreCountedOfThreadsThatMayMakeThem) {
+    for (u32 caches : {1, 2}) {
+        Machine machine("", {});
+        TrackingTable table = Counting::Table();
+        machine.host->demand.opened = true;
+        machine.host->demand.table = &table;
+        machine.host->cpusOpen = true;
+        cpu_set_t all;
+        ASSERT_EQ(sched_getaffinity(0, sizeof all, &all), 0);
+        CpuTopology *topology = &machine.host->cpus.topology;
+        topology->cpus = CPU_SETSIZE;
+        topology->lastCaches = caches;
+        for (u32 cpu = 0, seen = 0; cpu < CPU_SETSIZE; cpu++) {
+            topology->lastCache.push_back(CPU_ISSET(cpu, &all) ? seen++ % caches : NO_CPU);
+        }
+        cpu_set_t one = {};
+        CPU_SET(sched_getcpu(), &one);
+        ASSERT_EQ(sched_setaffinity(0, sizeof one, &one), 0);
+        auto own = static_cast<u32>(gettid());
+        EXPECT_EQ(HostCacheMoves(machine.host, own), 0U) << "bound inside one";
+        ASSERT_EQ(sched_setaffinity(0, sizeof all, &all), 0);
+        bool leaves = caches == 2 && CPU_COUNT(&all) > 1;
+        EXPECT_EQ(HostCacheMoves(machine.host, own) + HostCacheMoves(machine.host, own), leaves ? 14U : 0U);
+        EXPECT_EQ(Counting::Calls(), leaves ? (Strings{"caches 1024", "moves"}) : Strings());
     }
 }
 // clang-format on

@@ -65,7 +65,7 @@ KnfStatus TrackPeriods(LinuxHost *host, bool on) {
 
 // Whether all CPUs that the thread may run on share their last-level cache.
 bool IsBoundInside(const CpuTopology &topology, u32 tid) {
-    cpu_set_t allowed[8];
+    cpu_set_t allowed[8] = {};
     u32 inside = NO_CPU;
     if (sched_getaffinity(static_cast<pid_t>(tid), sizeof allowed, allowed) != 0) {
         return false;
