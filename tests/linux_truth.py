@@ -851,6 +851,24 @@ def periods():
     assert 199 <= rows[0]["histos"]["values"][3]["count"] <= rows[0]["histos"]["values"][1]["count"]
 
 
+def walk():
+    """So many vcpus that one walk over all threads tells of them, with none of their files open."""
+    counting("histograms of vcpus")
+    web = web_guest(",".join(f"CPU {i}/KVM" for i in range(140)))
+    web.do("[worker.move(1) for worker in workers]")
+    clocks = "[worker.clock() for worker in workers]"
+    run, begun = Run("-A"), web.do(clocks)
+    files = [os.readlink(path) for path in pathlib.Path(f"/proc/{run.process.pid}/fd").iterdir()]
+    check("files of threads", [name for name in files if name.endswith("schedstat")], [])
+    web.do("[worker.move(1 + i % 7) for i, worker in enumerate(workers)]")
+    web.do("workers[139].ask(sum, range(3000000))")
+    times = [last - first for first, last in zip(begun, web.do(clocks))]
+    vcpus = records(run.end())[0]["web1"]["vcpu"]
+    check("vcpus", [(vcpu["id"], vcpu["migtot"]) for vcpu in vcpus],
+          [(tid, i % 7) for i, tid in enumerate(web.threads)])
+    used(vcpus, times)
+
+
 def refused():
     """Histograms and interrupts for root of a user namespace, who may not count."""
     network(pairs=1)
@@ -942,7 +960,7 @@ def host():
 
 
 # How a test gets its namespaces: the first way that this user may go.
-WAYS = {"histograms": ["-n", "-Urn"], "periods": ["-n", "-Urn"], "ends": ["-n", "-Urn"], "interrupts": [""],
+WAYS = {"histograms": ["-n", "-Urn"], "periods": ["-n", "-Urn"], "walk": ["-n", "-Urn"], "ends": ["-n", "-Urn"], "interrupts": [""],
         "host": [""], "nic": [""], "no_proc": ["-Urnm", "-nm"], "storm": ["-Urnm", "-nm"], "stranger": ["-nmpf"],
         "macvtap": ["-nm"]}
 

@@ -160,6 +160,12 @@ u32 HostNetwork(LinuxHost *host);
 // Migrations of a vcpu between last-level caches; 0 where there is one, the vcpu is bound inside one, or nobody counts.
 u64 HostCacheMoves(LinuxHost *host, u32 tid);
 
+// host_walk.cpp. Whether one walk over all threads is to tell of the vcpus in place of two files each: decided once, by
+// the first read of one, when all that a run watches are listed.
+bool HostWalks(LinuxHost *host);
+// As the last walk of this generation met it.
+Outcome HostReadWalked(LinuxHost *host, ThreadUse *use, u32 *served, const ThreadRow **row);
+
 // host_histograms.cpp. Whether ports can have histograms, asked once.
 bool HostTakesHistograms(LinuxHost *host);
 

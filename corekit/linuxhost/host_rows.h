@@ -6,6 +6,7 @@
 #include "corekit/linuxhost/guests/guests.h"
 #include "corekit/linuxhost/netlink/queues.h"
 #include "corekit/linuxhost/pass.h"
+#include "corekit/linuxhost/proc/thread.h"
 #include "corekit/linuxhost/tracking/tracking.h"
 #include "corekit/node_source.h"
 
@@ -67,11 +68,18 @@ struct Member {
 // The four records of the IP stack.
 enum StackRecord : u8 { STACK_IPV4, STACK_IPV6, STACK_TCP, STACK_UDP, STACK_RECORDS };
 
-// A thread that is read by several nodes: one look serves them all.
+// A thread that is read by several nodes: one look serves them all. Files of a vcpu are opened by its first read, as a
+// walk over all threads may tell of it instead.
 struct ThreadUse {
     u32 tid = 0;
+    u32 pid = 0;
+    bool vcpu = false;
+    bool opened = false;
     Pass pass{};
     u32 served[4] = {};
+    u32 walked = 0;  // pass of the last walk that met it; 0: none yet
+    u64 born = 0;    // as that walk had it
+    ThreadRow row{};
 };
 
 // One histogram of a port. The kernel's counters only grow: `since` is what they grew by from the last reset on.
@@ -126,6 +134,9 @@ struct OnDemand {
     std::map<u32, Vector> vectors;                  // those that were listed
     Pass vectorPass{};
     bool vectorsRefused = false;
+    bool walkDecided = false;
+    bool walks = false;  // over all threads, in place of the files of vcpus
+    Pass walk{};
     std::unordered_set<u32> movers;  // threads whose migrations between caches are counted
     bool movesRefused = false;
 };

@@ -32,10 +32,24 @@ bool IsSelf(LinuxHost *host, int64_t id) {
     return UseOf(host, id) == nullptr && id == getpid();
 }
 
-Outcome Watch(LinuxHost *host, u32 pid, u32 tid, u32 wanted) {
+Outcome Watch(LinuxHost *host, ThreadUse *use, u32 wanted) {
     Threads *threads = OpenThreads(host);
-    host->uses[tid].tid = tid;
-    return threads != nullptr ? ThreadWatch(threads, pid, tid, wanted) : UNSUPPORTED;
+    use->opened = true;
+    return threads != nullptr ? ThreadWatch(threads, use->pid, use->tid, wanted) : UNSUPPORTED;
+}
+
+// A thread that is going to be read. One of another process is another one.
+ThreadUse *List(LinuxHost *host, u32 pid, u32 tid, bool vcpu) {
+    ThreadUse *use = &host->uses[tid];
+    if (use->pid != pid) {
+        *use = ThreadUse();
+        use->tid = tid;
+        use->pid = pid;
+    }
+    use->vcpu = use->vcpu || vcpu;
+    use->opened = false;  // one that ended may have come again
+    use->walked = 0;
+    return use;
 }
 
 Outcome ReadThread(LinuxHost *host, int64_t id, ThreadNode node, const ThreadRow **row) {
@@ -43,6 +57,14 @@ Outcome ReadThread(LinuxHost *host, int64_t id, ThreadNode node, const ThreadRow
     ThreadUse *use = UseOf(host, id);
     if (threads == nullptr || use == nullptr) {
         return threads == nullptr ? UNSUPPORTED : GONE;
+    }
+    if (use->vcpu && HostWalks(host)) {
+        return HostReadWalked(host, use, &use->served[node], row);
+    }
+    if (!use->opened) {
+        if (Outcome outcome = Watch(host, use, THREAD_TIMES | THREAD_MIGRATIONS); outcome != FINE) {
+            return outcome;
+        }
     }
     PassJoin(&use->pass, &use->served[node], host->now());
     return ThreadRead(threads, use->tid, use->pass.generation, row);
@@ -121,9 +143,7 @@ KnfStatus VcpuList(LinuxHost *host, const Params &keys, Params *entries) {
         return STATUS_NOT_FOUND;
     }
     for (u32 tid : guest->vcpus) {
-        if (Outcome outcome = Watch(host, guest->pid, tid, THREAD_TIMES | THREAD_MIGRATIONS); outcome != FINE) {
-            return StatusOf(outcome);
-        }
+        List(host, guest->pid, tid, true);
         entries->push_back(ParamOf(int64_t{tid}));
     }
     return STATUS_OK;
@@ -199,7 +219,8 @@ KnfStatus WorldletGet(LinuxHost *host, const Params &keys, char *record) {
     }
     const WorkerThread &worker = found->second;
     if (host->uses.find(worker.tid) == host->uses.end()) {
-        Watch(host, worker.pid, worker.tid, THREAD_TIMES | THREAD_MIGRATIONS | THREAD_REMOTE_WAKEUPS | THREAD_AFFINITY);
+        Watch(host, List(host, worker.pid, worker.tid, false),
+              THREAD_TIMES | THREAD_MIGRATIONS | THREAD_REMOTE_WAKEUPS | THREAD_AFFINITY);
     }
     const ThreadRow *row = nullptr;
     Outcome outcome = ReadThread(host, worker.tid, THREAD_STATES, &row);
