@@ -19,6 +19,9 @@ install(FILES docs/report.md docs/recipes.md third_party/uplot/LICENSE DESTINATI
   COMPONENT report)
 
 install(TARGETS corekit LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT corekit)
+if(TARGET corekit-tracking)
+  install(TARGETS corekit-tracking LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT corekit)
+endif()
 install(TARGETS knf-record knf-source RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT corekit)
 install(FILES docs/man/knf-record.1 docs/man/knf-source.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 COMPONENT corekit)
 install(FILES docs/linux.md docs/host-description.md docs/snapshot-format.md

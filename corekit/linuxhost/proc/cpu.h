@@ -9,7 +9,7 @@ struct CpuTopology {
     u32 packages;  // at least 1, so are the cores; of the CPUs that are on, as the kernel tells no others
     u32 cores;
     u32 lastCacheSharers;  // CPUs that share the last-level cache of the first CPU; 0 when the kernel does not tell
-    u32 lastCaches;              // in all; 0 when the kernel does not tell
+    u32 lastCaches;        // in all; 0 when the kernel does not tell
     std::vector<u32> lastCache;  // for each CPU the lowest one that shares its last-level cache; NO_CPU when untold
 };
 

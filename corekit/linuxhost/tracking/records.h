@@ -126,7 +126,7 @@ struct TaskSamples {
 #endif
 static_assert(sizeof(struct TrackedPort) == 12 && sizeof(struct PortSlot) == 64, "");
 static_assert(sizeof(struct PortCounts) == 216 && sizeof(struct PortRow) == 440, "");
-static_assert(sizeof(struct ThreadRow) == 536 && sizeof(struct VectorRow) == 24, "");
+static_assert(sizeof(struct PeriodRow) == 536 && sizeof(struct VectorRow) == 24, "");
 static_assert(sizeof(struct TaskSamples) == 64 && sizeof(struct Shared) <= 4096, "");
 
 // The kernel follows a sum within its bounds, but in 6.1 not the OR that the compiler would make of it.
