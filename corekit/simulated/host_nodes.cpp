@@ -219,10 +219,10 @@ const std::unordered_map<u32, RecordKind> &Kinds() {
         const Limits intervals = {1,    2,    5,    10,    20,    50,    100,    200,    500,
                                   1000, 2000, 5000, 10000, 20000, 50000, 100000, 200000, 500000};
         for (const RecordKind &kind :
-             {PortHistogram(NODE_CLUSTERS_IN, RX, clusters, 1), PortHistogram(NODE_CLUSTERS_OUT, TX, clusters, 2),
-              PortHistogram(NODE_SIZES_IN, RX, sizes, 60), PortHistogram(NODE_SIZES_OUT, TX, sizes, 66),
-              PortHistogram(NODE_INTERVALS_IN, RX, intervals, 3),
-              PortHistogram(NODE_INTERVALS_OUT, TX, intervals, 4)}) {
+             {PortHistogram(NODE_CLUSTERS_IN, TX, clusters, 1), PortHistogram(NODE_CLUSTERS_OUT, RX, clusters, 2),
+              PortHistogram(NODE_SIZES_IN, TX, sizes, 60), PortHistogram(NODE_SIZES_OUT, RX, sizes, 66),
+              PortHistogram(NODE_INTERVALS_IN, TX, intervals, 3),
+              PortHistogram(NODE_INTERVALS_OUT, RX, intervals, 4)}) {
             all.emplace(kind.node, kind);
         }
         all.emplace(NODE_VCPU_HISTO, VcpuHistogram(USED));

@@ -18,8 +18,8 @@ BUILD = pathlib.Path(sys.argv[1]).resolve()
 LINES = ".sysinfo.hostname as $h | .stats[] | {host:$h} + ."
 REPORTS = 200
 # What tells that each section was there, in each of its forms.
-KEYS = {"ring2sz", "maxpend", "coalesce", "hck", "hckcall", "txwdt", "physnic", "txqueue", "rxqueue", "intr", "ipv4", "udp",
-        "wdt", "vcpu", "buckets", "pktintervalout"}
+KEYS = {"ring2sz", "maxpend", "coalesce", "hck", "hckcall", "txwdt", "physnic", "txqueue", "rxqueue", "intr", "ipv4",
+        "udp", "wdt", "vcpu", "buckets", "pktintervalout"}
 
 
 def meter(host, arguments, **more):
@@ -140,7 +140,8 @@ def output_is_put_into_its_place():
     assert report("records", "-o", ".", "cut.json").returncode == 1
     for command in ("records", "table", "summary"):
         reader = subprocess.Popen([BUILD / "lan-report", command, "-o", "new"], stdin=subprocess.PIPE)
-        while not list(pathlib.Path().glob("new.*")):
+        state = pathlib.Path(f"/proc/{reader.pid}/stat")
+        while not list(pathlib.Path().glob("new.*")) or ") S " not in state.read_text():
             assert reader.poll() is None
         while reader.poll() is None:  # the first one waits for input, and two at once may come as one
             reader.terminate()

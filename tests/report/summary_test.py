@@ -294,7 +294,7 @@ def test_interrupted():
         reader.stdin.write(lines[3])
         reader.stdin.flush()
         text = reader.stdout.read().decode()
-    assert "records of 10 s" in text and "[F1]" in text and reader.returncode == 0, (reader.returncode, text)
+    assert " of 10 s" in text and "[F1]" in text and reader.returncode == 0, (reader.returncode, text)
 
 
 def test_rules():
