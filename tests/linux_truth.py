@@ -873,9 +873,9 @@ def walk():
 
 
 def refused():
-    """Histograms and interrupts for root of a user namespace, who may not count."""
+    """Histograms and interrupts for root without the rights to count, as in a user namespace."""
     network(pairs=1)
-    run = Run("-p", "1000", "-t", "hiV", "-n", "2")
+    run = Run("-p", "1000", "-t", "hiV", "-n", "2", wrapper="setpriv --bounding-set -bpf,-perfmon,-sys_admin")
     send("p0", 6, 100)
     run.go(1)
     send("p0", 4, 100)

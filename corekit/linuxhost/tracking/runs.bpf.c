@@ -30,12 +30,12 @@ static __always_inline struct PeriodRow *Find(const struct task_struct *task) {
     return row != 0 && row->task == (__u64)task ? row : 0;
 }
 
-// Ends a period and begins the next. The first one begins at an unknown time.
+// Ends a period and begins the next. The first one begins at an unknown time. Clocks of two CPUs may differ by some ns.
 static __always_inline void Step(struct PeriodRow *row, __u32 state) {
     __u64 now = bpf_ktime_get_ns();
     __u32 period = row->state - 1;
     if (period < PERIODS) {
-        __u64 length = now - row->since;
+        __u64 length = now > row->since ? now - row->since : 0;
         row->periods[period].sum += length;
         __u32 bucket = BucketOf(shared.limits[0], length);
         if (bucket < BUCKETS) {
