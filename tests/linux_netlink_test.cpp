@@ -491,9 +491,9 @@ TEST(LinuxDemand, AVectorIsNamedAfterItsNicsAndReadOnceAPass) {
     EXPECT_EQ(list(NODE_VECTOR_NAMES, {ParamOf(30)}), " eth1 ");
     EXPECT_EQ(list(NODE_VECTOR_NAMES, {ParamOf(31)}), " eth7 config");
     EXPECT_EQ(Counting::Calls(), (Strings{"watch 30", "watch 31"}));
-    for (u64 pass : {0, 1}) {
+    for (u64 pass : {u64{0}, u64{1}}) {
         for (int vector : {30, 31}) {
-            for (u64 cpu : {0, 1}) {
+            for (u64 cpu : {u64{0}, u64{1}}) {
                 std::array<u64, 2> told = {};
                 std::string record;
                 EXPECT_EQ(machine.Get(NODE_VECTOR_STATS, {ParamOf(vector), ParamOf(i64(cpu))}, &record), STATUS_OK);
@@ -514,7 +514,7 @@ TEST(LinuxDemand, AVectorIsNamedAfterItsNicsAndReadOnceAPass) {
 }
 
 TEST(LinuxDemand, MovesBetweenCachesAreCountedOfThreadsThatMayMakeThem) {
-    for (u32 caches : {1, 2}) {
+    for (u32 caches : {1U, 2U}) {
         Machine machine("", {});
         TrackingTable table = Counting::Table();
         machine.host->demand.opened = true;
