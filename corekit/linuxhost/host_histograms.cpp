@@ -58,7 +58,7 @@ void Reset(LinuxHost *host, PortFamily family, PortHistogram *histogram) {
 
 // What these receive, their driver hands to the stack in the name of the interface below.
 bool IsBlind(const Link &link) {
-    return link.kind == KIND_VLAN || link.kind == KIND_MACVLAN || link.kind == KIND_MACVTAP;
+    return link.kind == KIND_VLAN || link.kind == KIND_TEAM || link.kind == KIND_MACVLAN || link.kind == KIND_MACVTAP;
 }
 
 // The histograms of an interface as it is now; those of another one of its index end.
@@ -84,8 +84,9 @@ PortHistograms *Begin(LinuxHost *host, const Link &link) {
 // A histogram that can't be counted is served without samples, and that is said: a port that fails is lost for good.
 KnfStatus Start(LinuxHost *host, PortFamily family, PortHistogram *histogram) {
     if (histogram->blind) {
-        TellOnce(&host->toldBlind,
-                 "corekit: what VLANs, macvlans and macvtaps receive can't be seen: these histograms stay empty\n");
+        TellOnce(
+            &host->toldBlind,
+            "corekit: what VLANs, bonds, teams, macvlans and macvtaps receive can't be seen: these histograms stay empty\n");
         return STATUS_OK;
     }
     const TrackingTable *table = HostTracking(host);

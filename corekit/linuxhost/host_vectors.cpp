@@ -32,9 +32,13 @@ Owners FindOwners(LinuxHost *host, Names *nics) {
     return owners;
 }
 
+// A name with a digit behind it is another one's.
 bool AnyHas(const Names &actions, const std::string &name) {
-    return std::any_of(actions.begin(), actions.end(),
-                       [&](const std::string &action) { return action.find(name) != std::string::npos; });
+    return std::any_of(actions.begin(), actions.end(), [&](const std::string &action) {
+        size_t at = action.find(name);
+        size_t end = at != std::string::npos ? at + name.size() : 0;
+        return at != std::string::npos && (end == action.size() || action[end] < '0' || action[end] > '9');
+    });
 }
 
 // Of several NICs of one device a vector serves the one that its handlers are named after; all when none is.

@@ -54,6 +54,7 @@ enum LinkKind : u8 {
     KIND_TAP,
     KIND_VETH,
     KIND_VLAN,
+    KIND_TEAM,  // or bond
     KIND_MACVLAN,
     KIND_MACVTAP
 };

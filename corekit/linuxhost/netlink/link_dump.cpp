@@ -45,7 +45,7 @@ struct KindName {
 };
 constexpr KindName KINDS[] = {{"bridge", KIND_BRIDGE}, {"openvswitch", KIND_SWITCH}, {"tun", KIND_TAP},
                               {"veth", KIND_VETH}, {"vlan", KIND_VLAN}, {"macvlan", KIND_MACVLAN},
-                              {"macvtap", KIND_MACVTAP}, {"", KIND_NONE}};
+                              {"macvtap", KIND_MACVTAP}, {"bond", KIND_TEAM}, {"team", KIND_TEAM}, {"", KIND_NONE}};
 // clang-format on
 
 LinkKind KindOf(const char *name) {

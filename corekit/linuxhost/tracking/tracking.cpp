@@ -1,15 +1,30 @@
 #include "corekit/linuxhost/tracking/tracking.h"
 
 #include <dlfcn.h>
+#include <link.h>
 #include <string>
 #include <unistd.h>
 
 namespace {
 
-// Folder of the file that holds this code, with the slash behind it; empty when it can't be told.
+// The file that this process runs; empty when it can't be told.
+std::string Program() {
+    char path[4096];
+    ssize_t length = readlink("/proc/self/exe", path, sizeof path);
+    return length > 0 && length < static_cast<ssize_t>(sizeof path) ? std::string(path, static_cast<size_t>(length))
+                                                                    : "";
+}
+
+// Folder of the file that holds this code, with the slash behind it; empty when it can't be told. The loader has no
+// name for the program itself, and that which it was called by may be anything.
 std::string OwnFolder() {
     Dl_info info = {};
-    std::string file = dladdr(reinterpret_cast<void *>(TrackingOpen), &info) != 0 ? info.dli_fname : "";
+    void *found = nullptr;
+    if (dladdr1(reinterpret_cast<void *>(TrackingOpen), &info, &found, RTLD_DL_LINKMAP) == 0) {
+        return "";
+    }
+    const char *library = static_cast<const link_map *>(found)->l_name;
+    std::string file = *library != 0 ? library : Program();
     return file.substr(0, file.rfind('/') + 1);  // of a bare name nothing
 }
 
