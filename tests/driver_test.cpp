@@ -157,10 +157,15 @@ constexpr int LIMIT = 1000;
 #endif
 
 // Starts a run, sends it a signal after a while, and measures how long it takes to end.
+// Until the process catches SIGTERM, or two seconds for one that never will.
+constexpr char READY[] =
+    "for i in $(seq 40); do [ $((0x$(sed -n 's/^SigCgt:.//p' /proc/$pid/status) & 0x4000)) -ne 0 ] && break; "
+    "sleep 0.05; done; ";
+
 MeterRun Signalled(const std::string &command, const std::string &signal) {
     // Enough ports that their messages fill a pipe.
     return RunScript(HOST + "plain switch=sw0 port={100+i} type=2 client=many count=2000\n",
-                     command + " & pid=$!; sleep 0.3; start=$(date +%s%N); kill -" + signal +
+                     command + " & pid=$!; " + READY + "sleep 0.3; start=$(date +%s%N); kill -" + signal +
                          " $pid; wait $pid; echo $? >status; echo $((($(date +%s%N) - start) / 1000000)) >ms",
                      {"", true});
 }

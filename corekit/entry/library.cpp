@@ -154,8 +154,8 @@ int HckSyscall_Init(int mode, int flags, int reserved) {
         if (checkMode) [[unlikely]] {
             CheckInit({ParamOf(mode), ParamOf(flags), ParamOf(reserved)});
         }
-        library.initialised = true;
         bool connected = library.loadedByControl || LoadNamed();
+        library.initialised = true;  // behind the load, which makes the library anew
         if (connected && !AddNamedFaults()) {
             connected = false;
             library.live = {};
